@@ -1,0 +1,41 @@
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+
+if(NOT DEFINED CMAKE_CXX_COMPILER_LAUNCHER)
+    find_program(VEXA_CCACHE ccache)
+    if(VEXA_CCACHE)
+        set(CMAKE_CXX_COMPILER_LAUNCHER "${VEXA_CCACHE}")
+    endif()
+endif()
+
+# Results are exact to the bit on every compiler and machine: each float operation is rounded on its
+# own, so nothing may be fused.
+add_compile_options(-ffp-contract=off)
+
+add_compile_options(-Wall -Wextra -Wpedantic -Wshadow -Wconversion)
+if(CMAKE_CXX_COMPILER_ID MATCHES "Clang")
+    add_compile_options(-Wthread-safety)
+endif()
+if(VEXA_WERROR)
+    add_compile_options(-Werror)
+endif()
+
+if(VEXA_SANITIZE)
+    add_compile_options(-fsanitize=${VEXA_SANITIZE} -fno-sanitize-recover=all
+                        -fno-omit-frame-pointer)
+    add_link_options(-fsanitize=${VEXA_SANITIZE})
+endif()
+
+if(VEXA_FUZZ)
+    if(NOT CMAKE_CXX_COMPILER_ID MATCHES "Clang")
+        message(FATAL_ERROR "VEXA_FUZZ needs clang (use the preset `fuzz`)")
+    endif()
+    # Every layer is instrumented, the driver is linked into the fuzz targets alone.
+    add_compile_options(-fsanitize=fuzzer-no-link)
+endif()
+
+if(VEXA_COVERAGE)
+    add_compile_options(--coverage -fno-inline -fprofile-update=atomic)
+    add_link_options(--coverage)
+endif()

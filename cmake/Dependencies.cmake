@@ -1,0 +1,50 @@
+# What is used from Debian (installed by script/bootstrap):
+#   HeaderOnlyBoost, HeaderOnlyCli   header-only, so they serve a cross build as well
+#   VexaGoogleTest                   gtest and gmock with their main
+#   rapidcheck, benchmark::benchmark_main
+find_package(Threads REQUIRED)
+
+# vexa_header_only(<target> <folder> <header>): the header-only library in /usr/include/<folder>. A
+# cross compiler must not see the rest of that folder (the host's C library), so it gets a link to
+# the one library.
+function(vexa_header_only target folder header)
+    add_library(${target} INTERFACE)
+    if(NOT EXISTS "/usr/include/${folder}/${header}")
+        message(FATAL_ERROR
+                "/usr/include/${folder}/${header} is missing: run script/bootstrap first")
+    endif()
+    if(CMAKE_CROSSCOMPILING)
+        file(MAKE_DIRECTORY "${PROJECT_BINARY_DIR}/header-only/${folder}")
+        file(REMOVE_RECURSE "${PROJECT_BINARY_DIR}/header-only/${folder}")
+        file(CREATE_LINK "/usr/include/${folder}" "${PROJECT_BINARY_DIR}/header-only/${folder}"
+             SYMBOLIC)
+        target_include_directories(${target} SYSTEM INTERFACE "${PROJECT_BINARY_DIR}/header-only")
+    endif()
+endfunction()
+
+vexa_header_only(HeaderOnlyBoost boost json.hpp)
+vexa_header_only(HeaderOnlyCli CLI CLI.hpp)
+
+if(VEXA_TESTS)
+    add_library(VexaGoogleTest INTERFACE)
+    if(CMAKE_CROSSCOMPILING)
+        # Debian has no library for the target machine, but it ships the sources.
+        set(INSTALL_GTEST OFF)
+        set(CMAKE_POLICY_DEFAULT_CMP0077 NEW)
+        set(CMAKE_CXX_STANDARD 20)
+        add_subdirectory(/usr/src/googletest "${PROJECT_BINARY_DIR}/googletest" EXCLUDE_FROM_ALL
+                         SYSTEM)
+        target_link_libraries(VexaGoogleTest INTERFACE gmock_main gmock gtest)
+    else()
+        find_package(GTest REQUIRED)
+        target_link_libraries(VexaGoogleTest INTERFACE GTest::gmock_main GTest::gmock GTest::gtest)
+    endif()
+    target_link_libraries(VexaGoogleTest INTERFACE Threads::Threads)
+    include(GoogleTest)
+    if(VEXA_PROPERTY_TESTS)
+        find_package(rapidcheck REQUIRED)
+    endif()
+endif()
+if(VEXA_BENCHMARKS)
+    find_package(benchmark REQUIRED)
+endif()
