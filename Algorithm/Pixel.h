@@ -1,0 +1,79 @@
+#pragma once
+
+#include "Algorithm/PixelTable.h"
+
+#include <cstdint>
+
+namespace VexaTouch {
+
+/// "The larger of" two numbers: `old` stays on a tie and when they do not compare.
+constexpr float largerOrOld(float candidate, float old) noexcept {
+    return candidate > old ? candidate : old;
+}
+
+/// "The smaller of" two numbers: `old` stays on a tie and when they do not compare.
+constexpr float smallerOrOld(float candidate, float old) noexcept {
+    return candidate < old ? candidate : old;
+}
+
+/// The per-frame state of one sensor channel: the scaled sample, its progress toward the activation
+/// threshold, an on/off decision with hysteresis and statistics that accumulate over one touch.
+class Pixel {
+public:
+    /// An inactive pixel that has seen nothing.
+    Pixel(int index, float normalizationFactor) noexcept
+        : _normalizationFactor(normalizationFactor), _index(index) {}
+
+    /// One frame's update. `sample` is the frame's raw value within 16 signed bits,
+    /// `activationThreshold` the value that counts as progress 1.0; any float is accepted.
+    void updatePixelState(int sample, float activationThreshold) noexcept;
+
+    /// The region of `_index`.
+    [[nodiscard]] PixelRegion getPixelRegion() const noexcept { return pixelRegionOfIndex(_index); }
+
+    /// Forgets the touch: the three sticky statistics and nothing else.
+    void resetGlobalStats() noexcept;
+
+    std::int32_t _value = 0;     ///< sample times gain, truncated toward zero
+    float _normalizationFactor;  ///< gain, fixed at construction
+    float _progress = 0.0F;      ///< `_value` over the activation threshold
+    float _peakProgress = 0.0F;  ///< highest progress since the pixel last became active
+    float _valleyProgress = 0.0F;     ///< lowest progress since the pixel last became inactive
+    bool _isActive = false;           ///< on/off decision of this frame
+    bool _isAboveNoise = false;       ///< `_value` is above the noise level in this frame
+    bool _wasAboveNoise = false;      ///< sticky: was above noise since the last reset
+    bool _wasActive = false;          ///< sticky: was active since the last reset
+    float _maxProgressAboveNoise = 0.0F;  ///< sticky: highest progress while above noise
+    std::int32_t _index;  ///< 0 to 14; of a virtual pixel its strongest member's
+};
+
+inline void Pixel::updatePixelState(int sample, float activationThreshold) noexcept {
+    constexpr float kHysteresis = 0.6F;
+    _value = static_cast<std::int32_t>(static_cast<float>(sample) * _normalizationFactor);
+    // The decision of the previous frame chooses between the two edges of the hysteresis.
+    const float threshold =
+        _isActive ? _peakProgress * kHysteresis : largerOrOld(_valleyProgress / kHysteresis, 1.0F);
+    _progress = static_cast<float>(_value) / activationThreshold;
+    _isActive = _progress > threshold;
+    if (_isActive) {
+        _peakProgress = largerOrOld(_progress, _peakProgress);
+        _valleyProgress = _progress;
+        _wasActive = true;
+    } else {
+        _peakProgress = _progress;
+        _valleyProgress = smallerOrOld(_progress, _valleyProgress);
+    }
+    _isAboveNoise = _value > kNoiseLevel;
+    if (_isAboveNoise) {
+        _wasAboveNoise = true;
+        _maxProgressAboveNoise = largerOrOld(_progress, _maxProgressAboveNoise);
+    }
+}
+
+inline void Pixel::resetGlobalStats() noexcept {
+    _wasAboveNoise = false;
+    _wasActive = false;
+    _maxProgressAboveNoise = 0.0F;
+}
+
+}  // namespace VexaTouch

@@ -1,0 +1,109 @@
+#pragma once
+
+#include "Pipeline/Pipeline.h"
+#include "Platform/HostClock.h"
+#include "Platform/PropertyValue.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <list>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace VexaTouch {
+
+/// A pipeline that records every input it is given, keeps the recording bounded, can write it as a
+/// JSON document and can replay it frame by frame into itself.
+///
+/// Not synchronised: the owner serialises all calls. Copyable; a copy has its own frames (values
+/// are shared) and starts with playback idle.
+class PipelineRecording final : public Pipeline {
+public:
+    /// One recorded input.
+    struct Frame {
+        enum class Type : std::int32_t { State = 0, InputReport = 1 };
+
+        Type type = Type::InputReport;
+        std::uint64_t timestamp = 0;  ///< host time of the input in nanoseconds
+        std::string key;              ///< State only: the key as the pipeline received it
+        Vexa::PropertyValue value;    ///< State only: the value as received
+        std::vector<std::uint8_t> report;  ///< InputReport only: the raw report, id included
+
+        friend bool operator==(const Frame&, const Frame&) = default;
+    };
+
+    /// An empty, unbounded recording that takes its time from `clock` (which must outlive it).
+    explicit PipelineRecording(Vexa::HostClock& clock = Vexa::HostClock::system());
+
+    /// Reads a recording from the bytes of a container, ready to be played.
+    /// Throws std::invalid_argument or std::runtime_error with a short lowercase text on any fault
+    /// ("json not supplied" when there is no argument).
+    explicit PipelineRecording(std::optional<std::string_view> data,
+                               Vexa::HostClock& clock = Vexa::HostClock::system());
+
+    PipelineRecording(const PipelineRecording& other);
+    PipelineRecording& operator=(const PipelineRecording& other);
+    PipelineRecording(PipelineRecording&& other) noexcept;
+    PipelineRecording& operator=(PipelineRecording&& other) noexcept;
+    ~PipelineRecording() = default;
+
+    /// Ignored: time comes from the host clock when recording, from the frames when playing.
+    void setTime(std::uint64_t ticks) noexcept override;
+    /// Records the state change with the host's time, then forwards it.
+    void setState(const std::string& key, Vexa::PropertyValue value) noexcept override;
+    /// Records the report with the host's time, whatever it holds, then forwards it.
+    void handleInputReport(const std::uint8_t* bytes, std::size_t length) noexcept override;
+
+    /// Appends a frame and ends playback; trims once the list has reached twice the cap.
+    void appendFrame(Frame frame);
+
+    /// Keeps the newest `maxCount` input reports and, for each state key, the state frames that
+    /// still matter: the newest of each key between two kept reports and before the oldest one.
+    static void trimFrames(std::list<Frame>& frames, std::size_t maxCount);
+
+    /// Sets how many input reports are kept, 0 for all; trims at once if not 0. A trim that erases
+    /// the frame under the playback cursor ends the playback.
+    void setMaxFrameCount(std::size_t count);
+    [[nodiscard]] std::uint64_t maxFrameCount() const noexcept { return _maxFrameCount; }
+
+    [[nodiscard]] const std::list<Frame>& frames() const noexcept { return _frames; }
+
+    /// Starts or restarts playback from the first frame.
+    void playReset();
+    /// True while there is a frame to play.
+    [[nodiscard]] bool playCanContinue() const noexcept;
+    /// Plays one frame into this pipeline, waiting first (on the calling thread) as long as the
+    /// recorded time between two input reports divided by `speed`. A speed that is not above 0
+    /// counts as 1; infinity never waits. Throws std::runtime_error "playback finished" when there
+    /// is nothing to play.
+    void playNextFrame(float speed);
+
+    /// The container of this recording, trimmed to the cap first, as indented JSON.
+    std::string json();
+
+    /// The version-1 form of a parsed container: the value itself when it is one already.
+    /// Throws std::invalid_argument on any fault.
+    static Vexa::PropertyValue migrateSerializedContainer(const Vexa::PropertyValue& container);
+
+private:
+    struct Playback {
+        bool valid = false;
+        std::list<Frame>::iterator iterator;
+        std::uint64_t startTimeMach = 0;                    ///< host ticks
+        std::optional<std::uint64_t> lastInputReportTimeNs;  ///< recorded time
+    };
+
+    /// Trims without erasing the frame under the cursor of a running playback unnoticed.
+    void trimToCap();
+    void waitForFrame(const Frame& frame, float speed);
+
+    std::list<Frame> _frames;  ///< oldest first
+    std::uint64_t _maxFrameCount = 0;
+    Playback _play;
+    Vexa::HostClock* clock_;
+};
+
+}  // namespace VexaTouch
