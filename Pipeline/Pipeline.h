@@ -45,7 +45,7 @@ private:
 /// string-keyed state go in, time-stamped events come out through a probe.
 ///
 /// Probes observe the traffic on the caller's thread; an empty probe is skipped. The pipeline has
-/// no lock: its owner serialises all calls and every change of the probes. No exception leaves the
+/// no lock and no virtual destructor (pipelines are held by value, by their own type): its owner serialises all calls and every change of the probes. No exception leaves the
 /// operations, they end the process instead (a failing probe, a broken invariant). Copying copies
 /// the probes (sharing their closures), the time and the whole algorithm.
 class Pipeline {
@@ -87,13 +87,6 @@ public:
     Probe<const std::string&> getStateProbe;
 
 protected:
-    // Owners hold pipelines by value and by their own type; nothing deletes one through its base.
-    ~Pipeline() = default;
-    Pipeline(const Pipeline&) = default;
-    Pipeline& operator=(const Pipeline&) = default;
-    Pipeline(Pipeline&&) = default;
-    Pipeline& operator=(Pipeline&&) = default;
-
     std::uint64_t _timeMach = 0;  ///< host ticks
     Algs _algs;
 
