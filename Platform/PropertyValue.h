@@ -1,6 +1,5 @@
 #pragma once
 
-#include <atomic>
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
@@ -27,14 +26,14 @@ struct PropertyNode;
 class PropertyValue {
 public:
     enum class Type : std::uint8_t {
-        None,        ///< no value at all
-        Null,        ///< the value null
+        None,  ///< no value at all
+        Null,  ///< the value null
         Boolean,
-        Signed,      ///< 64-bit signed integer
-        Unsigned,    ///< 64-bit unsigned integer
-        Float,       ///< single-precision number, kept exactly
+        Signed,    ///< 64-bit signed integer
+        Unsigned,  ///< 64-bit unsigned integer
+        Float,     ///< single-precision number, kept exactly
         Double,
-        String,      ///< bytes, by convention UTF-8
+        String,  ///< bytes, by convention UTF-8
         Bytes,
         Array,
         Dictionary,
@@ -116,6 +115,8 @@ public:
     [[nodiscard]] std::string description() const;
 
 private:
+    friend struct Detail::PropertyNode;
+
     explicit PropertyValue(Detail::PropertyNode* adopted) noexcept : node_(adopted) {}
     static PropertyValue fromBoolean(bool value);
     static PropertyValue fromSigned(std::int64_t value);
