@@ -1,0 +1,46 @@
+#pragma once
+
+#include "Pipeline/PipelineRecording.h"
+#include "Tools/Failure.h"
+#include "Tools/Streams.h"
+
+#include <cstdint>
+#include <list>
+#include <optional>
+#include <string>
+
+namespace VexaTouch::Tools {
+
+/// A recording as it was read from a file.
+struct RecordingFile {
+    std::string name;  ///< for messages: the path, or "standard input"
+    std::list<PipelineRecording::Frame> frames;
+    std::uint32_t version = 0;    ///< of the container
+    std::uint64_t textBytes = 0;  ///< size of the text that was read
+};
+
+/// What could be saved of a damaged recording.
+struct RecoveredRecording {
+    RecordingFile file;
+    std::string damage;                         ///< what was wrong, empty when nothing was
+    std::optional<std::uint64_t> damageOffset;  ///< in bytes, when the text itself is damaged
+};
+
+/// Reads a recording from a path, or from the input stream for "-", piece by piece: the text is
+/// never in memory as a whole. Throws Failure with one line that names the file, what was wrong and
+/// where.
+RecordingFile readRecording(const std::string& path, Streams& streams);
+
+/// Reads every whole frame of a file that may be damaged or cut off. Throws Failure only when the
+/// file cannot be read at all.
+RecoveredRecording recoverRecording(const std::string& path, Streams& streams);
+
+/// Writes a version-1 container to a path, or to the result stream for "-". The file appears whole
+/// or not at all. Throws Failure.
+void writeRecording(const std::list<PipelineRecording::Frame>& frames, const std::string& path,
+                    Streams& streams);
+
+/// The frames as a recording ready to be played or written.
+PipelineRecording makeRecording(std::list<PipelineRecording::Frame> frames);
+
+}  // namespace VexaTouch::Tools

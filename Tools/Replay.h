@@ -1,0 +1,81 @@
+#pragma once
+
+#include "Algorithm/Algs.h"
+#include "Pipeline/PipelineRecording.h"
+#include "Shared/InputReport.h"
+#include "Tools/EventRecord.h"
+#include "Tools/SettingKeys.h"
+
+#include <cstdint>
+#include <limits>
+#include <list>
+#include <optional>
+#include <span>
+#include <string_view>
+#include <vector>
+
+namespace VexaTouch::Tools {
+
+/// What a played frame was to the pipeline.
+enum class PlayedType : std::uint8_t { Image, Firmware, Invalid, State };
+
+/// "image", "firmware", "invalid", "state".
+std::string_view playedTypeName(PlayedType type) noexcept;
+
+/// A frame that has just been played; valid until the next one is.
+struct PlayedFrame {
+    std::uint64_t index = 0;  ///< from 0, all frames of the recording counted
+    const PipelineRecording::Frame* frame = nullptr;
+    PlayedType type = PlayedType::State;
+    InputReport::Image image{};             ///< of type Image only
+    InputReport::FirmwareEvent firmware{};  ///< of type Firmware only
+    std::span<const EventRecord> events;    ///< what the pipeline made of it
+};
+
+/// What a replay counts as it goes.
+struct ReplayCounts {
+    std::uint64_t frames = 0;  ///< of any type
+    std::uint64_t images = 0;
+    std::uint64_t firmwareEvents = 0;
+    std::uint64_t invalidReports = 0;
+    std::uint64_t states = 0;
+    std::uint64_t events = 0;
+};
+
+/// Plays a recording through a pipeline frame by frame. Settings are given to the pipeline before
+/// the first frame and are not part of the recording; a state frame of the recording may change
+/// them later. Not thread safe, not movable.
+class Replay {
+public:
+    static constexpr float kNoWaiting = std::numeric_limits<float>::infinity();
+
+    explicit Replay(std::list<PipelineRecording::Frame> frames,
+                    std::span<const Setting> settings = {});
+    Replay(PipelineRecording recording, std::span<const Setting> settings);
+    Replay(const Replay&) = delete;
+    Replay& operator=(const Replay&) = delete;
+
+    [[nodiscard]] bool canContinue() const noexcept { return recording_.playCanContinue(); }
+
+    /// Plays the next frame at a factor of the recorded speed; kNoWaiting does not wait at all.
+    /// Throws std::runtime_error "playback finished" when there is none.
+    const PlayedFrame& next(float speed = kNoWaiting);
+
+    /// The algorithm as it stands after the last frame.
+    [[nodiscard]] const Algs& algs() const noexcept { return recording_.algs(); }
+    [[nodiscard]] const std::list<PipelineRecording::Frame>& frames() const noexcept {
+        return recording_.frames();
+    }
+    [[nodiscard]] const ReplayCounts& counts() const noexcept { return counts_; }
+
+private:
+    void installProbes();
+
+    PipelineRecording recording_;
+    std::list<PipelineRecording::Frame>::const_iterator upcoming_;
+    PlayedFrame played_;
+    std::vector<EventRecord> events_;
+    ReplayCounts counts_;
+};
+
+}  // namespace VexaTouch::Tools

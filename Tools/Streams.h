@@ -1,0 +1,19 @@
+#pragma once
+
+#include <istream>
+#include <ostream>
+
+namespace VexaTouch::Tools {
+
+/// Where a subcommand reads and writes: results go to `out`, status and faults to `error`.
+struct Streams {
+    std::istream& in;
+    std::ostream& out;
+    std::ostream& error;
+    bool outIsTerminal = false;
+    bool errorIsTerminal = false;
+    unsigned columns = 80;  ///< width of the terminal
+    unsigned rows = 24;     ///< height of the terminal
+};
+
+}  // namespace VexaTouch::Tools
