@@ -60,6 +60,9 @@ public:
     [[nodiscard]] std::string virtualStateDescription(const std::int16_t* samples,
                                                       unsigned int timeMs) const;
 
+    /// What the touch is doing, such as "HOLDING 812ms ActiveRegion=2"; empty when nothing is.
+    [[nodiscard]] std::string phaseDescription(unsigned int timeMs) const;
+
     [[nodiscard]] const std::vector<Pixel>& touchPixels() const noexcept { return _touchPixels; }
     [[nodiscard]] const std::vector<VirtualPixel>& virtualPixels() const noexcept {
         return _virtualPixels;
@@ -87,8 +90,7 @@ private:
     void decideEvent(std::uint32_t frameNumber, std::vector<Vexa::HidEvent>& events);
     void logFrame(const std::int16_t* samples, std::uint32_t frameNumber,
                   std::uint32_t timeMs) const;
-    [[nodiscard]] std::string describeHand(const std::string& channels, unsigned int timeMs) const;
-    [[nodiscard]] std::string phaseText(unsigned int timeMs) const;
+    [[nodiscard]] std::string describeFrame(const std::string& channels, unsigned int timeMs) const;
 
     // Threshold that the last update of the virtual pixels used: while it stays, a virtual pixel
     // that is inactive at value 0 and gets sample 0 again cannot change.

@@ -54,8 +54,8 @@ public:
     static constexpr float kDefaultCutoff = 7.389056F;  ///< e squared, bits 0x40EC7326
 
     SVM _svm;
-    float _touch_score = 0.0F;          ///< running sum of classifier scores, clamped
-    float _y_cutoff = kDefaultCutoff;   ///< decay constant of the touch score
+    float _touch_score = 0.0F;         ///< running sum of classifier scores, clamped
+    float _y_cutoff = kDefaultCutoff;  ///< decay constant of the touch score
     float _activationThreshold = 200.0F;
     std::uint32_t _hold_timeout_ms = 500;
     float _touch_score_threshold = 0.0F;  ///< a hold may start only at or above it

@@ -34,17 +34,17 @@ public:
     /// Forgets the touch: the three sticky statistics and nothing else.
     void resetGlobalStats() noexcept;
 
-    std::int32_t _value = 0;     ///< sample times gain, truncated toward zero
-    float _normalizationFactor;  ///< gain, fixed at construction
-    float _progress = 0.0F;      ///< `_value` over the activation threshold
-    float _peakProgress = 0.0F;  ///< highest progress since the pixel last became active
-    float _valleyProgress = 0.0F;     ///< lowest progress since the pixel last became inactive
-    bool _isActive = false;           ///< on/off decision of this frame
-    bool _isAboveNoise = false;       ///< `_value` is above the noise level in this frame
-    bool _wasAboveNoise = false;      ///< sticky: was above noise since the last reset
-    bool _wasActive = false;          ///< sticky: was active since the last reset
+    std::int32_t _value = 0;              ///< sample times gain, truncated toward zero
+    float _normalizationFactor;           ///< gain, fixed at construction
+    float _progress = 0.0F;               ///< `_value` over the activation threshold
+    float _peakProgress = 0.0F;           ///< highest progress since the pixel last became active
+    float _valleyProgress = 0.0F;         ///< lowest progress since the pixel last became inactive
+    bool _isActive = false;               ///< on/off decision of this frame
+    bool _isAboveNoise = false;           ///< `_value` is above the noise level in this frame
+    bool _wasAboveNoise = false;          ///< sticky: was above noise since the last reset
+    bool _wasActive = false;              ///< sticky: was active since the last reset
     float _maxProgressAboveNoise = 0.0F;  ///< sticky: highest progress while above noise
-    std::int32_t _index;  ///< 0 to 14; of a virtual pixel its strongest member's
+    std::int32_t _index;                  ///< 0 to 14; of a virtual pixel its strongest member's
 };
 
 inline void Pixel::updatePixelState(int sample, float activationThreshold) noexcept {

@@ -20,12 +20,11 @@ inline constexpr std::size_t kVirtualPixelCount = 23;
 
 /// The groups. Their positions are fixed: others read 18 ("IJK") and 19 ("KLM") by position.
 inline constexpr std::array<PixelGroup, kVirtualPixelCount> kPixelGroups = {{
-    {"ABE", 0.6667F},  {"ABF", 0.4444F},  {"ADEF", 0.6667F}, {"AEGJ", 0.5714F},
-    {"BCEF", 0.6667F}, {"BFHJ", 0.5714F}, {"CDE", 0.6667F},  {"CDF", 0.4651F},
-    {"CELN", 0.6667F}, {"DFLO", 0.6667F}, {"EFK", 0.4F},     {"EJK", 0.4F},
-    {"EKL", 0.4F},     {"FJK", 0.4F},     {"FKL", 0.4F},     {"GHI", 0.5714F},
-    {"GIJ", 0.4F},     {"HIJ", 0.4F},     {"IJK", 0.4F},     {"KLM", 0.4F},
-    {"LMN", 0.4444F},  {"LMO", 0.5714F},  {"MNO", 0.6667F},
+    {"ABE", 0.6667F},  {"ABF", 0.4444F}, {"ADEF", 0.6667F}, {"AEGJ", 0.5714F}, {"BCEF", 0.6667F},
+    {"BFHJ", 0.5714F}, {"CDE", 0.6667F}, {"CDF", 0.4651F},  {"CELN", 0.6667F}, {"DFLO", 0.6667F},
+    {"EFK", 0.4F},     {"EJK", 0.4F},    {"EKL", 0.4F},     {"FJK", 0.4F},     {"FKL", 0.4F},
+    {"GHI", 0.5714F},  {"GIJ", 0.4F},    {"HIJ", 0.4F},     {"IJK", 0.4F},     {"KLM", 0.4F},
+    {"LMN", 0.4444F},  {"LMO", 0.5714F}, {"MNO", 0.6667F},
 }};
 inline constexpr std::size_t kGroupIJK = 18;
 inline constexpr std::size_t kGroupKLM = 19;
@@ -53,8 +52,8 @@ private:
     void updateValuesRangeTested(const std::vector<Pixel>& pixels);
 
 public:
-    std::vector<std::int32_t> _maxPixelIndex;   ///< strongest member when last compared, 0 to 14
-    std::vector<float> _normalizationFactors;   ///< gain that a virtual pixel is built with
+    std::vector<std::int32_t> _maxPixelIndex;  ///< strongest member when last compared, 0 to 14
+    std::vector<float> _normalizationFactors;  ///< gain that a virtual pixel is built with
 };
 
 }  // namespace VexaTouch

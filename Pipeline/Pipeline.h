@@ -45,9 +45,10 @@ private:
 /// string-keyed state go in, time-stamped events come out through a probe.
 ///
 /// Probes observe the traffic on the caller's thread; an empty probe is skipped. The pipeline has
-/// no lock and no virtual destructor (pipelines are held by value, by their own type): its owner serialises all calls and every change of the probes. No exception leaves the
-/// operations, they end the process instead (a failing probe, a broken invariant). Copying copies
-/// the probes (sharing their closures), the time and the whole algorithm.
+/// no lock and no virtual destructor (pipelines are held by value, by their own type): its owner
+/// serialises all calls and every change of the probes. No exception leaves the operations, they
+/// end the process instead (a failing probe, a broken invariant). Copying copies the probes
+/// (sharing their closures), the time and the whole algorithm.
 class Pipeline {
 public:
     Pipeline() = default;

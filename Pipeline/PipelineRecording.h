@@ -27,9 +27,9 @@ public:
         enum class Type : std::int32_t { State = 0, InputReport = 1 };
 
         Type type = Type::InputReport;
-        std::uint64_t timestamp = 0;  ///< host time of the input in nanoseconds
-        std::string key;              ///< State only: the key as the pipeline received it
-        Vexa::PropertyValue value;    ///< State only: the value as received
+        std::uint64_t timestamp = 0;       ///< host time of the input in nanoseconds
+        std::string key;                   ///< State only: the key as the pipeline received it
+        Vexa::PropertyValue value;         ///< State only: the value as received
         std::vector<std::uint8_t> report;  ///< InputReport only: the raw report, id included
 
         friend bool operator==(const Frame&, const Frame&) = default;
@@ -92,7 +92,7 @@ private:
     struct Playback {
         bool valid = false;
         std::list<Frame>::iterator iterator;
-        std::uint64_t startTimeMach = 0;                    ///< host ticks
+        std::uint64_t startTimeMach = 0;                     ///< host ticks
         std::optional<std::uint64_t> lastInputReportTimeNs;  ///< recorded time
     };
 

@@ -1,0 +1,166 @@
+#include "Algorithm/Algs.h"
+
+#include <algorithm>
+#include <array>
+#include <bit>
+#include <limits>
+
+namespace VexaTouch {
+
+namespace {
+
+constexpr std::uint32_t kHoldEventMask = 0x2;
+constexpr std::uint32_t kTapEventMask = 0x20000;
+
+Vexa::HidEvent createEvent(std::uint32_t eventMask, PixelRegion region, Vexa::HidEventPhase phase) {
+    Vexa::DigitizerEventRecord record;
+    record.transducerType = 2;
+    record.eventMask = eventMask;
+    // The receiver tells the regions apart by the vertical coordinate alone.
+    record.y = static_cast<double>(static_cast<std::uint32_t>(region));
+    const Vexa::HidEvent event = Vexa::HidEvent::digitizer(record);
+    if (phase != Vexa::HidEventPhase::None) {
+        event.setPhase(phase);
+    }
+    return event;
+}
+
+/// The low 16 bits as a signed number: a group of very strong pixels deliberately wraps.
+constexpr int cutTo16Bits(std::int32_t value) noexcept {
+    return static_cast<std::int16_t>(static_cast<std::uint16_t>(value));
+}
+
+}  // namespace
+
+Algs::Algs() : quietThreshold_(std::numeric_limits<float>::quiet_NaN()) {
+    _touchPixels.reserve(kPixelCount);
+    for (std::size_t i = 0; i < kPixelCount; ++i) {
+        _touchPixels.emplace_back(static_cast<int>(i), kPixelGains[i]);
+    }
+    const auto& groups = _virtual_image.neighborPixelGroups();
+    _virtualPixels.reserve(groups.size());
+    for (std::size_t i = 0; i < groups.size(); ++i) {
+        _virtualPixels.emplace_back(groups[i], static_cast<signed char>(groups[i].front()),
+                                    _virtual_image._normalizationFactors[i]);
+    }
+}
+
+std::vector<Vexa::HidEvent> Algs::handleImage(const InputReport::Image& image) {
+    std::vector<Vexa::HidEvent> events;
+    processTouchFrame(image.signedPixels.data(), image.frameNumber, image.timestampMs, events);
+    return events;
+}
+
+std::vector<Vexa::HidEvent> Algs::handleReset() {
+    constexpr std::array<std::int16_t, kPixelCount> noTouch{};
+    std::vector<Vexa::HidEvent> events;
+    processTouchFrame(noTouch.data(), 0, 0, events);
+    return events;
+}
+
+void Algs::processTouchFrame(const std::int16_t* samples, std::uint32_t frameNumber,
+                             std::uint32_t timeMs, std::vector<Vexa::HidEvent>& events) {
+    updatePixels(samples);
+    _virtual_image.updateValues(_touchPixels);
+    updateVirtualPixels();
+    _handStats.updateHandState(_touchPixels, _virtualPixels, timeMs);
+    decideEvent(frameNumber, events);
+    _EventStats.update(_handStats);
+    if (_log.isEnabled(Vexa::LogLevel::Debug)) {
+        logFrame(samples, frameNumber, timeMs);
+    }
+}
+
+void Algs::updatePixels(const std::int16_t* samples) noexcept {
+    const float threshold = _handStats._activationThreshold;
+    for (std::size_t i = 0; i < kPixelCount; ++i) {
+        _touchPixels[i].updatePixelState(samples[i], threshold);
+    }
+}
+
+void Algs::updateVirtualPixels() {
+    const float threshold = _handStats._activationThreshold;
+    const bool sameThreshold =
+        std::bit_cast<std::uint32_t>(threshold) == std::bit_cast<std::uint32_t>(quietThreshold_);
+    const std::size_t groups = _virtual_image.neighborPixelGroups().size();
+    for (std::size_t i = 0; i < groups; ++i) {
+        const int sample = cutTo16Bits(_virtual_image._values.at(i));
+        VirtualPixel& pixel = _virtualPixels.at(i);
+        const std::int32_t strongest = _virtual_image._maxPixelIndex.at(i);
+        const bool quiet = sample == 0 && pixel._value == 0 && !pixel._isActive && sameThreshold;
+        if (quiet) {
+            pixel._index = strongest;
+        } else {
+            pixel.updatePixelState(sample, threshold, strongest);
+        }
+    }
+    quietThreshold_ = threshold;
+}
+
+void Algs::decideEvent(std::uint32_t frameNumber, std::vector<Vexa::HidEvent>& events) {
+    const HandStats& hand = _handStats;
+    const PixelRegion region = hand._activeRegion;
+    const bool liftedOff = !hand._isTouching && hand._wasTouching;
+    const auto dispatch = [&](const Vexa::HidEvent& event) {
+        event.setIntegerField(Vexa::HidEventField::DigitizerFrameNumber, frameNumber);
+        _lastDispatchedPhase = static_cast<std::uint16_t>(event.phase());
+        events.push_back(event);
+    };
+
+    // The first row that holds decides; those that end a touch forget its statistics.
+    if (hand._isTouching && !hand._wasTouching) {
+        dispatch(createMayBeginEvent(region));
+    } else if (hand._isHolding && !hand._wasHolding) {
+        dispatch(createHoldStartEvent(region));
+    } else if (hand._isHolding && region != hand._previousActiveRegion) {
+        dispatch(createHoldChangeEvent(region));
+    } else if (!hand._isHolding && hand._wasHolding) {
+        Reset();
+        dispatch(createHoldEndEvent(region));
+    } else if (hand._isTap) {
+        Reset();
+        dispatch(createTapEvent(region));
+    } else if (liftedOff) {
+        Reset();
+        // Only a touch of which nothing but its may-begin was seen is taken back.
+        if (_lastDispatchedPhase == static_cast<std::uint16_t>(Vexa::HidEventPhase::MayBegin)) {
+            dispatch(createCancelEvent());
+        }
+    }
+}
+
+void Algs::Reset() noexcept {
+    for (Pixel& pixel : _touchPixels) {
+        pixel.resetGlobalStats();
+    }
+    for (VirtualPixel& pixel : _virtualPixels) {
+        pixel.resetGlobalStats();
+    }
+    _handStats.Reset();
+}
+
+Vexa::HidEvent Algs::createMayBeginEvent(PixelRegion region) {
+    return createEvent(0, region, Vexa::HidEventPhase::MayBegin);
+}
+
+Vexa::HidEvent Algs::createHoldStartEvent(PixelRegion region) {
+    return createEvent(kHoldEventMask, region, Vexa::HidEventPhase::Began);
+}
+
+Vexa::HidEvent Algs::createHoldChangeEvent(PixelRegion region) {
+    return createEvent(kHoldEventMask, region, Vexa::HidEventPhase::Changed);
+}
+
+Vexa::HidEvent Algs::createHoldEndEvent(PixelRegion region) {
+    return createEvent(kHoldEventMask, region, Vexa::HidEventPhase::Ended);
+}
+
+Vexa::HidEvent Algs::createTapEvent(PixelRegion region) {
+    return createEvent(kTapEventMask, region, Vexa::HidEventPhase::None);
+}
+
+Vexa::HidEvent Algs::createCancelEvent() {
+    return createEvent(0, kRegionNone, Vexa::HidEventPhase::Cancelled);
+}
+
+}  // namespace VexaTouch
