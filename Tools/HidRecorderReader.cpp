@@ -24,6 +24,16 @@ constexpr bool isBlank(char c) noexcept {
     throw std::invalid_argument(std::move(what));
 }
 
+// A piece of the text for a message: short, and nothing that a terminal would act on.
+std::string quoted(std::string_view text) {
+    constexpr std::size_t kLongest = 32;
+    std::string shown = "'";
+    for (const char c : text.substr(0, kLongest)) {
+        shown += c >= ' ' && c <= '~' ? c : '?';
+    }
+    return shown + (text.size() > kLongest ? "...'" : "'");
+}
+
 // Reads a line word by word.
 class Words {
 public:
@@ -68,14 +78,14 @@ std::uint64_t expectNumber(Words& words, const char* name) {
     const std::string_view word = words.next();
     const auto value = readNumber(word);
     if (!value) {
-        fault(std::string(name) + " '" + std::string(word) + "' is no number");
+        fault(std::string(name) + " " + quoted(word) + " is no number");
     }
     return *value;
 }
 
 void expectEnd(const Words& words) {
     if (!words.atEnd()) {
-        fault("unexpected '" + std::string(words.rest()) + "'");
+        fault("unexpected " + quoted(words.rest()));
     }
 }
 
@@ -86,11 +96,11 @@ std::uint64_t readTime(std::string_view word) {
     const auto microseconds = point == std::string_view::npos ? std::optional<std::uint64_t>()
                                                               : readNumber(word.substr(point + 1));
     if (!seconds || !microseconds || *microseconds > 999'999) {
-        fault("time '" + std::string(word) + "' is not seconds.microseconds");
+        fault("time " + quoted(word) + " is not seconds.microseconds");
     }
     constexpr auto kMaximum = std::numeric_limits<std::uint64_t>::max();
     if (*seconds > (kMaximum - *microseconds * 1000) / kNanosecondsPerSecond) {
-        fault("time '" + std::string(word) + "' is too large");
+        fault("time " + quoted(word) + " is too large");
     }
     return *seconds * kNanosecondsPerSecond + *microseconds * 1000;
 }
@@ -107,7 +117,7 @@ std::uint8_t readByte(std::string_view word) {
     // Two digits always: a line that was cut in the middle of a byte shows.
     const auto [end, error] = std::from_chars(word.data(), word.data() + word.size(), value, 16);
     if (word.size() != 2 || error != std::errc() || end != word.data() + word.size()) {
-        fault("'" + std::string(word) + "' is no byte");
+        fault(quoted(word) + " is no byte");
     }
     return value;
 }
