@@ -11,11 +11,12 @@
 
 namespace VexaTouch {
 
-/// Reads a recording container piece by piece straight into frames, so that a text need never be in
-/// memory as a whole. Not thread safe.
+/// Reads a recording container piece by piece straight into frames, so that neither a text nor a
+/// tree of it need be in memory as a whole. Not thread safe.
 ///
-/// Whatever the order of members in the text, faults are reported in this order: a syntax error,
-/// then what migration refuses, then what the frames lack; of equals the first in the text.
+/// Whatever the order of members in the text, faults come in this order: a syntax error, then what
+/// migration refuses, then what the frames lack; of equals the first in the text. Of duplicate
+/// members the last one stands.
 class ContainerReader {
 public:
     ContainerReader();
@@ -29,22 +30,25 @@ public:
     /// Ends the text and gives its frames. Throws as PipelineRecording's constructor does.
     std::list<PipelineRecording::Frame> finish();
 
-    /// Container version as read (low 32 bits), after finish.
-    [[nodiscard]] std::uint32_t version() const noexcept;
-    /// Where and what the first fault is, as far as known, after write gave false or finish threw:
-    /// bytes read before a syntax error, and the position of the refused frame in its array.
+    /// The version that the text names (its low 32 bits), as far as read.
+    [[nodiscard]] std::optional<std::uint32_t> version() const noexcept;
+    /// Bytes before a syntax error, after write gave false or finish threw for it.
     [[nodiscard]] std::optional<std::uint64_t> errorOffset() const noexcept;
-    [[nodiscard]] std::optional<std::uint64_t> errorFrame() const noexcept;
-    /// The reader's own words for a syntax error; empty when there was none.
+    /// What the syntax error was, empty when there was none.
     [[nodiscard]] std::string syntaxError() const;
+    /// Position of the refused frame in its array, from 0, after finish threw for a frame.
+    [[nodiscard]] std::optional<std::uint64_t> errorFrame() const noexcept;
 
-    /// The whole frames read so far, also of a text that is damaged or cut off; leaves the reader
-    /// spent. For recovery only: frames() of a good text come from finish.
+    /// For texts that are damaged or cut off: the whole, well-formed frames read so far, of
+    /// whichever version. The reader is spent afterwards.
     std::list<PipelineRecording::Frame> recover();
+    /// Whole frames read so far that were refused.
+    [[nodiscard]] std::uint64_t refusedFrames() const noexcept;
 
 private:
     class Handler;
-    std::unique_ptr<Handler> handler_;
+    struct State;
+    std::unique_ptr<State> state_;
 };
 
 }  // namespace VexaTouch

@@ -28,6 +28,7 @@ private:
 
     Sink sink_;
     std::string text_;
+    std::string hex_;  // one report's text, kept for its memory
     Vexa::JsonWriter json_;
 };
 

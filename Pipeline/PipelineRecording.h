@@ -44,6 +44,10 @@ public:
     explicit PipelineRecording(std::optional<std::string_view> data,
                                Vexa::HostClock& clock = Vexa::HostClock::system());
 
+    /// A recording of these frames, unbounded, ready to be played.
+    explicit PipelineRecording(std::list<Frame> frames,
+                               Vexa::HostClock& clock = Vexa::HostClock::system());
+
     PipelineRecording(const PipelineRecording& other);
     PipelineRecording& operator=(const PipelineRecording& other);
     PipelineRecording(PipelineRecording&& other) noexcept;

@@ -1,0 +1,68 @@
+#include "Pipeline/ContainerWriter.h"
+
+#include "Pipeline/ContainerFormat.h"
+#include "Shared/Util.h"
+
+#include <utility>
+
+namespace VexaTouch {
+
+namespace {
+
+/// How much text is gathered before the sink gets it.
+constexpr std::size_t kPieceSize = std::size_t{1} << 16U;
+
+}  // namespace
+
+ContainerWriter::ContainerWriter(Sink sink) : sink_(std::move(sink)), json_(text_) {
+    text_.reserve(kPieceSize + kPieceSize / 4);
+    json_.beginObject();
+    json_.key(Container::Version);
+    json_.number(std::uint64_t{Container::kVersion});
+    json_.key(Container::Frames);
+    json_.beginArray();
+}
+
+void ContainerWriter::write(const PipelineRecording::Frame& frame) {
+    using Type = PipelineRecording::Frame::Type;
+    if (frame.type != Type::InputReport && frame.type != Type::State) {
+        return;
+    }
+    json_.beginObject();
+    json_.key(Container::Type);
+    json_.plainString(frame.type == Type::State ? Container::TypeState
+                                                : Container::TypeInputReport);
+    json_.key(Container::Timestamp);
+    json_.number(frame.timestamp);
+    if (frame.type == Type::State) {
+        json_.key(Container::Key);
+        json_.string(frame.key);
+        if (frame.value) {
+            json_.key(Container::Value);
+            json_.value(frame.value);
+        }
+    } else {
+        json_.key(Container::Report);
+        hex_.clear();
+        Util::appendHexString(hex_, frame.report);
+        json_.plainString(hex_);
+    }
+    json_.endObject();
+    if (text_.size() >= kPieceSize) {
+        flush();
+    }
+}
+
+void ContainerWriter::finish() {
+    json_.endArray();
+    json_.endObject();
+    text_ += '\n';
+    flush();
+}
+
+void ContainerWriter::flush() {
+    sink_(text_);
+    text_.clear();
+}
+
+}  // namespace VexaTouch

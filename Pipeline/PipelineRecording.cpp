@@ -1,0 +1,208 @@
+#include "Pipeline/PipelineRecording.h"
+
+#include "Pipeline/ContainerReader.h"
+#include "Pipeline/ContainerWriter.h"
+#include "Shared/Util.h"
+
+#include <limits>
+#include <stdexcept>
+#include <unordered_set>
+#include <utility>
+
+namespace VexaTouch {
+
+namespace {
+
+using Frame = PipelineRecording::Frame;
+using FrameList = std::list<Frame>;
+
+/// Trims as PipelineRecording::trimFrames does; true if the frame at `watched` was erased.
+bool trim(FrameList& frames, std::size_t maxCount, FrameList::const_iterator watched) {
+    bool watchedErased = false;
+    // Views of kept frames' keys: a kept frame outlives the walk.
+    std::unordered_set<std::string_view> seenKeys;
+    std::size_t keptReports = 0;
+    for (auto next = frames.end(); next != frames.begin();) {
+        const auto frame = std::prev(next);
+        bool keep = true;
+        if (frame->type == Frame::Type::State) {
+            keep = seenKeys.insert(frame->key).second;
+        } else if (frame->type == Frame::Type::InputReport) {
+            keep = keptReports < maxCount;
+            if (keep) {
+                ++keptReports;
+                seenKeys.clear();
+            }
+        }
+        if (keep) {
+            next = frame;
+        } else {
+            watchedErased = watchedErased || frame == watched;
+            next = frames.erase(frame);
+        }
+    }
+    return watchedErased;
+}
+
+/// Whole microseconds to wait, clamped before it becomes an integer. The division by the speed is
+/// single precision like every number of the system.
+std::uint64_t waitMicroseconds(std::uint64_t nanoseconds, float speed) noexcept {
+    const float microseconds = static_cast<float>(nanoseconds) / speed / 1000.0F;
+    constexpr float kLimit = 9223372036854775808.0F;  // 2^63
+    return microseconds < kLimit ? static_cast<std::uint64_t>(microseconds)
+                                 : static_cast<std::uint64_t>(kLimit);
+}
+
+std::list<Frame> readFrames(std::optional<std::string_view> data) {
+    if (!data) {
+        throw std::invalid_argument("json not supplied");
+    }
+    ContainerReader reader;
+    reader.write(*data);
+    return reader.finish();
+}
+
+}  // namespace
+
+PipelineRecording::PipelineRecording(Vexa::HostClock& clock) : clock_(&clock) {}
+
+PipelineRecording::PipelineRecording(std::optional<std::string_view> data, Vexa::HostClock& clock)
+    : _frames(readFrames(data)), clock_(&clock) {}
+
+PipelineRecording::PipelineRecording(std::list<Frame> frames, Vexa::HostClock& clock)
+    : _frames(std::move(frames)), clock_(&clock) {}
+
+PipelineRecording::PipelineRecording(const PipelineRecording& other)
+    : Pipeline(other),
+      _frames(other._frames),
+      _maxFrameCount(other._maxFrameCount),
+      clock_(other.clock_) {}
+
+PipelineRecording& PipelineRecording::operator=(const PipelineRecording& other) {
+    if (this != &other) {
+        *this = PipelineRecording(other);
+    }
+    return *this;
+}
+
+PipelineRecording::PipelineRecording(PipelineRecording&& other) noexcept
+    : Pipeline(std::move(other)),
+      _frames(std::move(other._frames)),
+      _maxFrameCount(other._maxFrameCount),
+      clock_(other.clock_) {
+    other._play = {};
+}
+
+PipelineRecording& PipelineRecording::operator=(PipelineRecording&& other) noexcept {
+    Pipeline::operator=(std::move(other));
+    _frames = std::move(other._frames);
+    _maxFrameCount = other._maxFrameCount;
+    clock_ = other.clock_;
+    _play = {};
+    other._play = {};
+    return *this;
+}
+
+void PipelineRecording::setTime(std::uint64_t /*ticks*/) noexcept {}
+
+void PipelineRecording::setState(const std::string& key, Vexa::PropertyValue value) noexcept {
+    const std::uint64_t now = clock_->now();
+    Pipeline::setTime(now);
+    Frame frame;
+    frame.type = Frame::Type::State;
+    frame.timestamp = Util::nanosecondsFromMachTime(now);
+    frame.key = key;
+    frame.value = value;
+    appendFrame(std::move(frame));
+    Pipeline::setState(key, std::move(value));
+}
+
+void PipelineRecording::handleInputReport(const std::uint8_t* bytes, std::size_t length) noexcept {
+    const std::uint64_t now = clock_->now();
+    Pipeline::setTime(now);
+    Frame frame;
+    frame.timestamp = Util::nanosecondsFromMachTime(now);
+    frame.report.assign(bytes, bytes + length);
+    appendFrame(std::move(frame));
+    Pipeline::handleInputReport(bytes, length);
+}
+
+void PipelineRecording::appendFrame(Frame frame) {
+    _frames.push_back(std::move(frame));
+    // The list grows to twice the cap and is then cut back in one pass. Halving the size instead of
+    // doubling the cap keeps a huge cap from overflowing.
+    if (_maxFrameCount != 0 && _frames.size() / 2 >= _maxFrameCount) {
+        trimFrames(_frames, _maxFrameCount);
+    }
+    _play.valid = false;
+}
+
+void PipelineRecording::trimFrames(std::list<Frame>& frames, std::size_t maxCount) {
+    trim(frames, maxCount, frames.end());
+}
+
+void PipelineRecording::setMaxFrameCount(std::size_t count) {
+    _maxFrameCount = count;
+    trimToCap();
+}
+
+void PipelineRecording::trimToCap() {
+    if (_maxFrameCount == 0) {
+        return;
+    }
+    const auto cursor = _play.valid ? FrameList::const_iterator(_play.iterator) : _frames.cend();
+    if (trim(_frames, _maxFrameCount, cursor)) {
+        _play.valid = false;
+    }
+}
+
+void PipelineRecording::playReset() {
+    _play.startTimeMach = clock_->now();
+    _play.iterator = _frames.begin();
+    _play.lastInputReportTimeNs.reset();
+    _play.valid = true;
+}
+
+bool PipelineRecording::playCanContinue() const noexcept {
+    return _play.valid && _play.iterator != _frames.end();
+}
+
+void PipelineRecording::playNextFrame(float speed) {
+    if (!playCanContinue()) {
+        throw std::runtime_error("playback finished");
+    }
+    const Frame& frame = *_play.iterator++;
+    if (frame.type == Frame::Type::InputReport) {
+        waitForFrame(frame, speed > 0.0F ? speed : 1.0F);
+    }
+    Pipeline::setTime(_play.startTimeMach +
+                      Util::machTimeFromNanoseconds(frame.timestamp - _frames.front().timestamp));
+    if (frame.type == Frame::Type::InputReport) {
+        Pipeline::handleInputReport(frame.report.data(), frame.report.size());
+    } else if (frame.type == Frame::Type::State) {
+        Pipeline::setState(frame.key, frame.value);
+    }
+}
+
+void PipelineRecording::waitForFrame(const Frame& frame, float speed) {
+    const auto last = std::exchange(_play.lastInputReportTimeNs, frame.timestamp);
+    if (last && frame.timestamp > *last) {
+        const std::uint64_t wait = waitMicroseconds(frame.timestamp - *last, speed);
+        if (wait != 0) {
+            clock_->sleepMicroseconds(wait);
+        }
+    }
+}
+
+std::string PipelineRecording::json() {
+    trimToCap();
+    std::string text;
+    ContainerWriter writer([&text](std::string_view piece) { text += piece; });
+    for (const Frame& frame : _frames) {
+        writer.write(frame);
+    }
+    writer.finish();
+    return text;
+}
+
+}  // namespace VexaTouch
