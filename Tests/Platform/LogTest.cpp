@@ -1,0 +1,149 @@
+#include "Platform/Log.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <stdexcept>
+#include <string>
+#include <thread>
+#include <vector>
+
+namespace Vexa {
+namespace {
+
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+constexpr std::array kCategories = {LogCategory::HIDService, LogCategory::Pipeline,
+                                    LogCategory::Recording, LogCategory::Algs};
+
+/// Collects messages, and leaves the process's log as it was.
+class LogTest : public testing::Test {
+protected:
+    LogTest() {
+        Log::setSink([this](LogCategory category, LogLevel level, std::string_view message) {
+            lines.push_back(std::string(logCategoryName(category)) + "/" +
+                            std::string(logLevelName(level)) + "/" + std::string(message));
+        });
+    }
+    ~LogTest() override {
+        Log::setSink({});
+        for (const LogCategory category : kCategories) Log::setLevel(category, LogLevel::Error);
+    }
+
+    std::vector<std::string> lines;
+};
+
+TEST_F(LogTest, OnlyErrorsAreWrittenAtFirst) {
+    for (const LogCategory category : kCategories) {
+        const Log log(category);
+        EXPECT_FALSE(log.isEnabled(LogLevel::Debug));
+        EXPECT_FALSE(log.isEnabled(LogLevel::Info));
+        EXPECT_TRUE(log.isEnabled(LogLevel::Error));
+    }
+    const Log log(LogCategory::Pipeline);
+    log.write(LogLevel::Debug, "d");
+    log.write(LogLevel::Info, "i");
+    log.write(LogLevel::Error, "e");
+    EXPECT_THAT(lines, ElementsAre("Pipeline/error/e"));
+}
+
+TEST_F(LogTest, EachCategoryHasItsOwnLevel) {
+    Log::setLevel(LogCategory::Algs, LogLevel::Debug);
+    Log::setLevel(LogCategory::Recording, LogLevel::Info);
+    Log::setLevel(LogCategory::Pipeline, LogLevel::Off);
+    for (const LogCategory category : kCategories) {
+        for (const LogLevel level : {LogLevel::Debug, LogLevel::Info, LogLevel::Error}) {
+            Log(category).write(level, "m");
+        }
+    }
+    EXPECT_THAT(lines, ElementsAre("HIDService/error/m", "Recording/info/m", "Recording/error/m",
+                                   "Algs/debug/m", "Algs/info/m", "Algs/error/m"));
+}
+
+TEST_F(LogTest, NothingIsLoggedAtOff) {
+    Log::setLevel(LogCategory::Algs, LogLevel::Debug);
+    EXPECT_FALSE(Log(LogCategory::Algs).isEnabled(LogLevel::Off));
+    Log(LogCategory::Algs).write(LogLevel::Off, "m");
+    Log::setLevel(LogCategory::Algs, LogLevel::Off);
+    Log(LogCategory::Algs).write(LogLevel::Off, "m");
+    EXPECT_THAT(lines, IsEmpty());
+}
+
+TEST_F(LogTest, ASinkThatThrowsLosesTheMessageOnly) {
+    const Log log(LogCategory::Algs);
+    Log::setSink([](LogCategory, LogLevel, std::string_view) { throw std::runtime_error("full"); });
+    log.write(LogLevel::Error, "lost");
+    Log::setSink(
+        [this](LogCategory, LogLevel, std::string_view message) { lines.emplace_back(message); });
+    log.write(LogLevel::Error, "kept");
+    EXPECT_THAT(lines, ElementsAre("kept"));
+}
+
+TEST_F(LogTest, ASinkMayLogAndReplaceItself) {
+    const Log log(LogCategory::Algs);
+    Log::setSink([this, log, text = std::string("own")](LogCategory, LogLevel, std::string_view) {
+        log.write(LogLevel::Error, "from the sink");
+        Log::setSink([this](LogCategory, LogLevel, std::string_view message) {
+            lines.push_back("second: " + std::string(message));
+        });
+        lines.push_back("first: " + text);
+    });
+    log.write(LogLevel::Error, "1");
+    log.write(LogLevel::Error, "2");
+    EXPECT_THAT(lines, ElementsAre("first: own", "second: 2"));
+}
+
+TEST_F(LogTest, WithoutASinkALineGoesToStandardError) {
+    Log::setSink({});
+    testing::internal::CaptureStderr();
+    Log(LogCategory::HIDService).write(LogLevel::Error, "disjoint image");
+    EXPECT_EQ(testing::internal::GetCapturedStderr(), "HIDService error: disjoint image\n");
+}
+
+TEST_F(LogTest, ThreadsLogOneAtATime) {
+    std::vector<std::thread> threads;
+    for (int thread = 0; thread < 4; ++thread) {
+        threads.emplace_back([] {
+            const Log log(LogCategory::Pipeline);
+            for (int round = 0; round < 250; ++round) {
+                log.write(LogLevel::Error, "m");
+                log.write(LogLevel::Debug, "never");
+            }
+        });
+    }
+    for (int round = 0; round < 100; ++round) Log::setLevel(LogCategory::Algs, LogLevel::Info);
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(lines, std::vector<std::string>(1000, "Pipeline/error/m"));
+}
+
+TEST(LogNameTest, NamesReadBack) {
+    for (const LogCategory category : kCategories) {
+        EXPECT_EQ(logCategoryFromName(logCategoryName(category)), category);
+    }
+    for (const LogLevel level : {LogLevel::Debug, LogLevel::Info, LogLevel::Error, LogLevel::Off}) {
+        EXPECT_EQ(logLevelFromName(logLevelName(level)), level);
+    }
+    EXPECT_EQ(logCategoryName(LogCategory::HIDService), "HIDService");
+    EXPECT_EQ(logCategoryName(LogCategory::Algs), "Algs");
+    EXPECT_EQ(logLevelName(LogLevel::Debug), "debug");
+}
+
+TEST(LogNameTest, OnlyLevelsAreReadRegardlessOfCase) {
+    EXPECT_EQ(logLevelFromName("DEBUG"), LogLevel::Debug);
+    EXPECT_EQ(logLevelFromName("Off"), LogLevel::Off);
+    EXPECT_EQ(logLevelFromName("warn"), std::nullopt);
+    EXPECT_EQ(logLevelFromName("debugging"), std::nullopt);
+    EXPECT_EQ(logLevelFromName(""), std::nullopt);
+    EXPECT_EQ(logCategoryFromName("algs"), std::nullopt);
+    EXPECT_EQ(logCategoryFromName(""), std::nullopt);
+}
+
+TEST(LogNameTest, UnknownCodesHaveAPlaceholder) {
+    EXPECT_EQ(logCategoryName(static_cast<LogCategory>(9)), "?");
+    EXPECT_EQ(logLevelName(static_cast<LogLevel>(9)), "?");
+}
+
+}  // namespace
+}  // namespace Vexa
