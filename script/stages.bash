@@ -3,6 +3,7 @@
 #   stage NAME COMMAND...        runs the command into a log, which is shown only when it fails
 #   stage_shown NAME COMMAND...  the same, its output shown as it comes
 #   stages_done                  the summary; fails unless every stage passed
+#   run_ctest PRESET...          what a test stage runs
 #
 # A command that exits with 77 could not run: its last line says why, the stage counts as skipped.
 
@@ -53,6 +54,21 @@ stage_shown() {
     mkdir -p "$stage_logs"
     "$@" </dev/null 2>&1 | tee "$log" || status=$?
     _stage_end "$name" "$status" $((SECONDS - start)) "$log"
+    return "$status"
+}
+
+# run_ctest PRESET [CTEST-OPTION...]: every test of the preset; a test that was skipped is a failure.
+run_ctest() {
+    local preset=$1 output
+    shift
+    output=$(mktemp)
+    local status=0
+    ctest --preset "$preset" --parallel "$(nproc)" "$@" 2>&1 | tee "$output" || status=1
+    if grep -E '\*\*\*(Skipped|Not Run)|Not Run \(Disabled\)' "$output"; then
+        echo "tests were skipped"
+        status=1
+    fi
+    rm -f "$output"
     return "$status"
 }
 
