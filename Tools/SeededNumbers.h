@@ -24,8 +24,8 @@ public:
 
     /// A number from `lowest` to `highest`, both included.
     constexpr std::int32_t between(std::int32_t lowest, std::int32_t highest) noexcept {
-        return lowest + static_cast<std::int32_t>(
-                            below(static_cast<std::uint32_t>(highest - lowest) + 1U));
+        return lowest +
+               static_cast<std::int32_t>(below(static_cast<std::uint32_t>(highest - lowest) + 1U));
     }
 
     /// A number from -`amplitude` to `amplitude`, likeliest at 0 (the sum of two even draws).

@@ -33,23 +33,23 @@ struct SurfacePad {
     }
 };
 
-/// All pads in reading order. The pixels A to F, J and L have two pads each, mirrored through the
-/// middle or across it, which are sensed as one; so the neighbours of a group such as "ADEF" lie
-/// together at one side of the surface and those of "BCEF" at the other.
+/// All pads in reading order. The pixels A to F, J and L have two pads each, on opposite sides,
+/// which are sensed as one; so the members of the group "ADEF" are neighbours at the left edge and
+/// those of "BCEF" at the right.
 inline constexpr std::array<SurfacePad, 23> kSurfacePads = {{
-    {'H', -5, -12}, {'G', 5, -12},                 //
-    {'I', 0, -10},                                 //
-    {'B', -11, -8}, {'A', 11, -8},                 //
-    {'J', -7, -6},  {'J', 7, -6},                  //
-    {'F', -11, -4}, {'E', 11, -4},                 //
-    {'A', -15, -2}, {'B', 15, -2},                 //
-    {'K', 0, 0},                                   //
-    {'D', -15, 2},  {'C', 15, 2},                  //
-    {'E', -11, 4},  {'F', 11, 4},                  //
-    {'L', -7, 6},   {'L', 7, 6},                   //
-    {'C', -11, 8},  {'D', 11, 8},                  //
-    {'M', 0, 10},                                  //
-    {'N', -5, 12},  {'O', 5, 12},                  //
+    {'H', -5, -12}, {'G', 5, -12},  //
+    {'I', 0, -10},                  //
+    {'B', -11, -8}, {'A', 11, -8},  //
+    {'J', -7, -6},  {'J', 7, -6},   //
+    {'F', -11, -4}, {'E', 11, -4},  //
+    {'A', -15, -2}, {'B', 15, -2},  //
+    {'K', 0, 0},                    //
+    {'D', -15, 2},  {'C', 15, 2},   //
+    {'E', -11, 4},  {'F', 11, 4},   //
+    {'L', -7, 6},   {'L', 7, 6},    //
+    {'C', -11, 8},  {'D', 11, 8},   //
+    {'M', 0, 10},                   //
+    {'N', -5, 12},  {'O', 5, 12},   //
 }};
 
 /// A place with a name of its own, in whole surface units.
@@ -66,8 +66,8 @@ inline constexpr std::array<NamedPlace, 3> kNamedPlaces = {{
     {"vol-", 0, 11, "volume down: among M, N and O at the bottom"},
 }};
 
-/// The grid: columns A to G from left to right and rows 1 to 7 from top to bottom, so that D4 is the
-/// middle. Spacing in surface units.
+/// The grid: columns A to G from left to right and rows 1 to 7 from top to bottom, so that D4 is
+/// the middle. Spacing in surface units.
 inline constexpr std::int32_t kGridSize = 7;
 inline constexpr std::int32_t kGridColumnSpacing = 5;
 inline constexpr std::int32_t kGridRowSpacing = 4;
