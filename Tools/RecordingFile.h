@@ -40,7 +40,4 @@ RecoveredRecording recoverRecording(const std::string& path, Streams& streams);
 void writeRecording(const std::list<PipelineRecording::Frame>& frames, const std::string& path,
                     Streams& streams);
 
-/// The frames as a recording ready to be played or written.
-PipelineRecording makeRecording(std::list<PipelineRecording::Frame> frames);
-
 }  // namespace VexaTouch::Tools

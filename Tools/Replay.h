@@ -51,7 +51,6 @@ public:
 
     explicit Replay(std::list<PipelineRecording::Frame> frames,
                     std::span<const Setting> settings = {});
-    Replay(PipelineRecording recording, std::span<const Setting> settings);
     Replay(const Replay&) = delete;
     Replay& operator=(const Replay&) = delete;
 

@@ -19,9 +19,11 @@ struct Setting {
 
 /// Reads KEY=VALUE: the key as the host writes it ("Pipeline.Algs.ActivationThreshold") or the bare
 /// key of the algorithm, the value as JSON. Throws UsageError, with the list of keys, for a key
-/// that nothing knows, a read-only key, an index out of range or a value that is no JSON.
-Setting parseSetting(std::string_view text);
-std::vector<Setting> parseSettings(std::span<const std::string> texts);
+/// that nothing knows, a read-only key, an index out of range or a value that is no JSON. `option`
+/// is what the text was given to, for the message.
+Setting parseSetting(std::string_view text, std::string_view option = "--set");
+std::vector<Setting> parseSettings(std::span<const std::string> texts,
+                                   std::string_view option = "--set");
 
 /// The keys that can be set, their defaults and meaning: aligned lines for help and error texts.
 std::string settingKeysText();

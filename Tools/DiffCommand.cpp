@@ -1,0 +1,303 @@
+#include "Tools/DiffCommand.h"
+
+#include "Platform/Json.h"
+#include "Tools/Failure.h"
+#include "Tools/Progress.h"
+#include "Tools/RecordingFile.h"
+#include "Tools/Replay.h"
+#include "Tools/StateSnapshot.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace VexaTouch::Tools {
+namespace {
+
+constexpr std::array<PositionalEntry, 2> kPositionals = {{
+    {.name = "A", .help = "The recording; - reads standard input"},
+    {.name = "B",
+     .help = "The recording to compare with; left out, it is A again with other settings",
+     .required = false},
+}};
+
+constexpr std::string_view kSettingChoices =
+    "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= "
+    "EnableTapSuppression= VirtualNormalizationFactors. ResetEventStats=";
+
+constexpr std::array<OptionEntry, 3> kOptions = {{
+    {.name = "--set-a",
+     .valueName = "KEY=VALUE",
+     .help = "Give the replay of A a setting before its first frame, as replay --set does",
+     .repeatable = true,
+     .kind = ValueKind::Choice,
+     .choices = kSettingChoices},
+    {.name = "--set-b",
+     .valueName = "KEY=VALUE",
+     .help = "The same for the replay of B",
+     .repeatable = true,
+     .kind = ValueKind::Choice,
+     .choices = kSettingChoices},
+    {.name = "--json", .help = "Print one JSON object"},
+}};
+
+constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
+    {kExitSuccess, "the replays are the same on every frame"},
+    {kExitFailure, "they differ, or a recording cannot be read (then standard error says so)"},
+    {kExitUsage, "the command line is wrong, an unknown setting included"},
+}};
+
+constexpr std::array<ExampleEntry, 3> kExamples = {{
+    {"vexatouch diff session.json --set-b ActivationThreshold=150",
+     "Shows what another threshold changes, from the first frame on"},
+    {"vexatouch diff --set-a HoldTimeoutMilliseconds=300 --set-b HoldTimeoutMilliseconds=700 "
+     "session.json",
+     "Compares two settings with each other"},
+    {"vexatouch diff before.json after.json", "Compares two recordings frame by frame"},
+}};
+
+constexpr std::string_view kDescription =
+    "Replays A and B side by side and compares, frame by frame, what each frame was, its events "
+    "and every field of the algorithm's state after it. Printed are the first frame that differs "
+    "with all its differing fields, then for each field the number of frames on which it differs. "
+    "Frames are paired by their place in the recording.\n"
+    "\n"
+    "Fields are named as in the output of replay --trace: pixels[A]._progress, "
+    "virtual[ABE]._value, hand._isTouching, stats.numTaps, events.";
+
+constexpr std::string_view kEventsField = "events";
+constexpr std::string_view kMissingField = "(no such frame)";
+
+struct FieldDifference {
+    std::string field;
+    std::string a;
+    std::string b;
+};
+
+/// What two replays differ in.
+struct Comparison {
+    std::uint64_t framesA = 0;
+    std::uint64_t framesB = 0;
+    std::uint64_t framesDifferent = 0;
+    std::uint64_t firstIndex = 0;                               ///< of the first frame that differs
+    std::vector<FieldDifference> first;                         ///< its fields
+    std::vector<std::pair<std::string, std::uint64_t>> counts;  ///< frames by field, those above 0
+};
+
+std::string eventsText(std::span<const EventRecord> events) {
+    std::string text = "[";
+    for (const EventRecord& event : events) {
+        text += text.size() > 1 ? "," : "";
+        appendEventJson(text, event);
+    }
+    return text + "]";
+}
+
+/// Plays one side; the snapshot is that of its last frame.
+class Side {
+public:
+    Side(std::list<PipelineRecording::Frame> frames, std::span<const Setting> settings)
+        : replay_(std::move(frames), settings) {}
+
+    /// False when the recording has ended.
+    bool advance() {
+        played_ = replay_.canContinue() ? &replay_.next() : nullptr;
+        if (played_ == nullptr) {
+            return false;
+        }
+        snapshot_.take(*played_, replay_.algs());
+        return true;
+    }
+
+    [[nodiscard]] std::span<const EventRecord> events() const { return played_->events; }
+    [[nodiscard]] const StateSnapshot& snapshot() const noexcept { return snapshot_; }
+    [[nodiscard]] std::uint64_t frameCount() const noexcept { return replay_.frames().size(); }
+
+private:
+    Replay replay_;
+    const PlayedFrame* played_ = nullptr;
+    StateSnapshot snapshot_;
+};
+
+Comparison compare(Side& a, Side& b, Streams& streams) {
+    Comparison result{
+        .framesA = a.frameCount(), .framesB = b.frameCount(), .first = {}, .counts = {}};
+    std::vector<std::uint64_t> counts(StateSnapshot::fieldCount(), 0);
+    std::uint64_t eventCount = 0;
+    const std::uint64_t both = std::min(result.framesA, result.framesB);
+    Progress progress(streams, "comparing", both);
+    for (std::uint64_t index = 0; index < both; ++index) {
+        a.advance();
+        b.advance();
+        bool different = false;
+        const bool isFirst = result.framesDifferent == 0;
+        a.snapshot().forEachDifference(b.snapshot(), [&](std::size_t field) {
+            different = true;
+            ++counts[field];
+            if (isFirst) {
+                result.first.push_back({StateSnapshot::fieldName(field),
+                                        a.snapshot().fieldText(field),
+                                        b.snapshot().fieldText(field)});
+            }
+        });
+        if (!std::ranges::equal(a.events(), b.events())) {
+            different = true;
+            ++eventCount;
+            if (isFirst) {
+                result.first.push_back(
+                    {std::string(kEventsField), eventsText(a.events()), eventsText(b.events())});
+            }
+        }
+        if (different && isFirst) {
+            result.firstIndex = index;
+        }
+        result.framesDifferent += different ? 1 : 0;
+        progress.update(index);
+    }
+    const std::uint64_t unpaired = std::max(result.framesA, result.framesB) - both;
+    if (unpaired > 0 && result.framesDifferent == 0) {
+        result.firstIndex = both;
+        const std::string shorter = "no frame";
+        const std::string longer = "a frame";
+        result.first.push_back({std::string(kMissingField),
+                                result.framesA > both ? longer : shorter,
+                                result.framesB > both ? longer : shorter});
+    }
+    result.framesDifferent += unpaired;
+    for (std::size_t field = 0; field < counts.size(); ++field) {
+        if (counts[field] > 0) {
+            result.counts.emplace_back(StateSnapshot::fieldName(field), counts[field]);
+        }
+    }
+    if (eventCount > 0) {
+        result.counts.emplace_back(kEventsField, eventCount);
+    }
+    if (unpaired > 0) {
+        result.counts.emplace_back(kMissingField, unpaired);
+    }
+    return result;
+}
+
+void printText(const Comparison& comparison, Streams& streams) {
+    if (comparison.framesDifferent == 0) {
+        return;
+    }
+    std::size_t width = 0;
+    for (const auto& [field, count] : comparison.counts) {
+        width = std::max(width, field.size());
+    }
+    for (const FieldDifference& difference : comparison.first) {
+        width = std::max(width, difference.field.size());
+    }
+    const auto padded = [width](std::string field) {
+        field.resize(width, ' ');
+        return field;
+    };
+    streams.out << "First difference at frame index " << comparison.firstIndex << ":\n";
+    for (const FieldDifference& difference : comparison.first) {
+        streams.out << "  " << padded(difference.field) << "  " << difference.a << " | "
+                    << difference.b << '\n';
+    }
+    streams.out << "Frames that differ, by field:\n";
+    for (const auto& [field, count] : comparison.counts) {
+        streams.out << "  " << padded(field) << "  " << count << '\n';
+    }
+}
+
+void printJson(const Comparison& comparison, Streams& streams) {
+    std::string text;
+    Vexa::JsonWriter json(text, Vexa::JsonWriter::Style::Compact);
+    json.beginObject();
+    json.key("frames_a");
+    json.number(comparison.framesA);
+    json.key("frames_b");
+    json.number(comparison.framesB);
+    json.key("frames_different");
+    json.number(comparison.framesDifferent);
+    json.key("first");
+    if (comparison.framesDifferent == 0) {
+        json.null();
+    } else {
+        json.beginObject();
+        json.key("index");
+        json.number(comparison.firstIndex);
+        json.key("fields");
+        json.beginObject();
+        for (const FieldDifference& difference : comparison.first) {
+            json.key(difference.field);
+            json.beginArray();
+            // A text that is no JSON stands for a frame that is not there.
+            const auto write = [&json](const std::string& value) {
+                const Vexa::PropertyValue read = Vexa::readJson(value);
+                json.value(read ? read : Vexa::PropertyValue(value));
+            };
+            write(difference.a);
+            write(difference.b);
+            json.endArray();
+        }
+        json.endObject();
+        json.endObject();
+    }
+    json.key("counts");
+    json.beginObject();
+    for (const auto& [field, count] : comparison.counts) {
+        json.key(field);
+        json.number(count);
+    }
+    json.endObject();
+    json.endObject();
+    streams.out << text << '\n';
+}
+
+RecordingFile readSide(const std::string& path, Streams& streams) {
+    RecordingFile file = readRecording(path, streams);
+    if (file.frames.empty()) {
+        throw Failure(file.name + ": holds no frame to replay");
+    }
+    return file;
+}
+
+int runDiff(const Arguments& arguments, Streams& streams) {
+    const std::vector<Setting> settingsA = parseSettings(arguments.values("--set-a"), "--set-a");
+    const std::vector<Setting> settingsB = parseSettings(arguments.values("--set-b"), "--set-b");
+    if (!arguments.given("B") && settingsA.empty() && settingsB.empty()) {
+        throw UsageError("nothing to compare A with: give B, --set-a or --set-b");
+    }
+    if (arguments.value("A") == "-" && arguments.value("B") == "-") {
+        throw UsageError("only one recording can come from standard input");
+    }
+    RecordingFile fileA = readSide(arguments.value("A"), streams);
+    std::list<PipelineRecording::Frame> framesB =
+        arguments.given("B") ? readSide(arguments.value("B"), streams).frames : fileA.frames;
+    Side a(std::move(fileA.frames), settingsA);
+    Side b(std::move(framesB), settingsB);
+    const Comparison comparison = compare(a, b, streams);
+    if (arguments.given("--json")) {
+        printJson(comparison, streams);
+    } else {
+        printText(comparison, streams);
+    }
+    streams.out.flush();
+    streams.error << comparison.framesDifferent << " of "
+                  << std::max(comparison.framesA, comparison.framesB) << " frames differ\n";
+    return comparison.framesDifferent == 0 ? kExitSuccess : kExitFailure;
+}
+
+}  // namespace
+
+constinit const Command diffCommand = {
+    .name = "diff",
+    .summary = "Compare two replays frame by frame and field by field",
+    .description = kDescription,
+    .positionals = kPositionals,
+    .options = kOptions,
+    .exitCodes = kExitCodes,
+    .examples = kExamples,
+    .run = runDiff,
+};
+
+}  // namespace VexaTouch::Tools
