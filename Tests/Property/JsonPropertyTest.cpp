@@ -13,6 +13,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
+#include <iostream>
 #include <limits>
 #include <optional>
 #include <string>
@@ -25,6 +26,24 @@ namespace {
 
 using Peer = nlohmann::json;
 using Type = PropertyValue::Type;
+
+/// As rc::check, with more rounds than its default unless RC_PARAMS asks for still more.
+template <class Property>
+bool holds(const std::string& description, Property&& property) {
+    constexpr int kRounds = 2000;
+    rc::detail::TestMetadata metadata;
+    metadata.id = description;
+    metadata.description = description;
+    rc::detail::TestParams params = rc::detail::configuration().testParams;
+    params.maxSuccess = std::max(params.maxSuccess, kRounds);
+    const auto result =
+        rc::detail::checkTestable(std::forward<Property>(property), metadata, params);
+    if (result.template is<rc::detail::SuccessResult>()) return true;
+    std::cerr << description << ": ";
+    rc::detail::printResultMessage(result, std::cerr);
+    std::cerr << std::endl;
+    return false;
+}
 
 /// Which values a generator may make.
 enum class Domain : std::uint8_t {
@@ -127,11 +146,11 @@ rc::Gen<PropertyValue> anyValue(Domain domain, int depth = 4) {
     if (depth == 0) return scalar(domain);
     const auto inner = rc::gen::lazy([=] { return anyValue(domain, depth - 1); });
     const auto array = rc::gen::map(
-        rc::gen::scale(0.2, rc::gen::container<std::vector<PropertyValue>>(inner)),
+        rc::gen::scale(0.3, rc::gen::container<std::vector<PropertyValue>>(inner)),
         [](PropertyValue::Array elements) { return PropertyValue(std::move(elements)); });
     // Keys are repaired like other text; with valid ones no two of them become one.
     const auto dictionary = rc::gen::map(
-        rc::gen::scale(0.2, rc::gen::container<std::vector<std::pair<std::string, PropertyValue>>>(
+        rc::gen::scale(0.3, rc::gen::container<std::vector<std::pair<std::string, PropertyValue>>>(
                                 rc::gen::pair(utf8Text(), inner))),
         [](const std::vector<std::pair<std::string, PropertyValue>>& members) {
             return PropertyValue(PropertyValue::Dictionary(members.begin(), members.end()));
@@ -297,7 +316,7 @@ std::string floatingPointText() {
 }
 
 TEST(JsonPropertyTest, AValueWithAJsonFormReadsBackTheSame) {
-    EXPECT_TRUE(rc::check("write, then read", [] {
+    EXPECT_TRUE(holds("write, then read", [] {
         const PropertyValue value = *anyValue(Domain::JsonForm);
         const std::string text = writeJson(value, *anyStyle());
         RC_LOG() << text;
@@ -306,7 +325,7 @@ TEST(JsonPropertyTest, AValueWithAJsonFormReadsBackTheSame) {
 }
 
 TEST(JsonPropertyTest, APeerReadsWhatIsWritten) {
-    EXPECT_TRUE(rc::check("write, then read by the peer", [] {
+    EXPECT_TRUE(holds("write, then read by the peer", [] {
         const PropertyValue value = *anyValue(Domain::Any);
         const std::string text = writeJson(value, *anyStyle());
         RC_LOG() << text << "\nfor " << value.description();
@@ -316,14 +335,14 @@ TEST(JsonPropertyTest, APeerReadsWhatIsWritten) {
 }
 
 TEST(JsonPropertyTest, TextIsRepairedAsThePeerRepairsIt) {
-    EXPECT_TRUE(rc::check("invalid UTF-8", [] {
+    EXPECT_TRUE(holds("invalid UTF-8", [] {
         const std::string text = *nearlyUtf8Text();
         RC_ASSERT(Peer::parse(writeJson(text)).get<std::string>() == repaired(text));
     }));
 }
 
 TEST(JsonPropertyTest, APeersTextIsRead) {
-    EXPECT_TRUE(rc::check("written by the peer, then read", [] {
+    EXPECT_TRUE(holds("written by the peer, then read", [] {
         const Peer peer = Peer::parse(writeJson(*anyValue(Domain::JsonForm)));
         const std::string text =
             peer.dump(*rc::gen::inRange(-1, 5), ' ', *rc::gen::arbitrary<bool>());
@@ -333,7 +352,7 @@ TEST(JsonPropertyTest, APeersTextIsRead) {
 }
 
 TEST(JsonPropertyTest, DamagedTextIsReadOrRefusedAsByThePeer) {
-    EXPECT_TRUE(rc::check("damaged text", [] {
+    EXPECT_TRUE(holds("damaged text", [] {
         const std::string text = damagedText();
         RC_LOG() << text;
         const std::optional<PropertyValue> expected = peerAnswer(text);
@@ -342,7 +361,7 @@ TEST(JsonPropertyTest, DamagedTextIsReadOrRefusedAsByThePeer) {
 }
 
 TEST(JsonPropertyTest, PiecesDoNotChangeTheAnswer) {
-    EXPECT_TRUE(rc::check("damaged text in pieces", [] {
+    EXPECT_TRUE(holds("damaged text in pieces", [] {
         const std::string text = damagedText();
         RC_LOG() << text;
         RC_ASSERT(readInPieces(text, *pieceSizes()) == readJson(text));
@@ -350,7 +369,7 @@ TEST(JsonPropertyTest, PiecesDoNotChangeTheAnswer) {
 }
 
 TEST(JsonPropertyTest, ANumberIsTheNearestDouble) {
-    EXPECT_TRUE(rc::check("floating-point text", [] {
+    EXPECT_TRUE(holds("floating-point text", [] {
         const std::string text = floatingPointText();
         RC_LOG() << text;
         const PropertyValue expected = std::strtod(text.c_str(), nullptr);
@@ -361,7 +380,7 @@ TEST(JsonPropertyTest, ANumberIsTheNearestDouble) {
 }
 
 TEST(JsonPropertyTest, AnOverflowingExponentIsReadWhereverItStands) {
-    EXPECT_TRUE(rc::check("exponents beyond 32 bits", [] {
+    EXPECT_TRUE(holds("exponents beyond 32 bits", [] {
         // Each of these stands for a member whose number the library alone would refuse.
         std::string text = "[";
         PropertyValue::Array expected;
