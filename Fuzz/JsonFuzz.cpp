@@ -1,0 +1,75 @@
+// Any text reads to a value or to none, whole or in pieces alike; a value is written and reads back
+// as its documented normal form.
+
+#include "Platform/Json.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstdint>
+#include <cstdlib>
+#include <functional>
+#include <iostream>
+#include <string>
+#include <string_view>
+
+namespace {
+
+using Vexa::JsonParser;
+using Vexa::JsonValueBuilder;
+using Vexa::JsonWriter;
+using Vexa::PropertyValue;
+
+void require(bool holds, const char* what) {
+    if (holds) return;
+    std::cerr << "does not hold: " << what << "\n";
+    std::abort();
+}
+
+PropertyValue readInPieces(std::string_view text, std::uint32_t seed, std::uint32_t longest) {
+    JsonValueBuilder builder;
+    JsonParser parser(builder);
+    while (!text.empty()) {
+        seed = seed * 1664525u + 1013904223u;
+        const std::size_t size = std::min<std::size_t>(text.size(), 1 + (seed >> 16) % longest);
+        if (!parser.write(text.substr(0, size))) return {};
+        text.remove_prefix(size);
+    }
+    return parser.finish() ? builder.take() : PropertyValue();
+}
+
+/// What was read, as it reads back: an infinite number has no JSON form and becomes null.
+PropertyValue normalForm(const PropertyValue& value) {
+    if (const auto* array = value.asArray()) {
+        PropertyValue::Array elements;
+        for (const PropertyValue& element : *array) elements.push_back(normalForm(element));
+        return elements;
+    }
+    if (const auto* dictionary = value.asDictionary()) {
+        PropertyValue::Dictionary members;
+        for (const auto& [name, member] : *dictionary) members[name] = normalForm(member);
+        return members;
+    }
+    return std::isfinite(value.toDouble()) ? value : PropertyValue::null();
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+    const std::string_view text(reinterpret_cast<const char*>(data), size);
+    const PropertyValue value = Vexa::readJson(text);
+
+    const auto seed = static_cast<std::uint32_t>(std::hash<std::string_view>()(text));
+    require(readInPieces(text, seed, 1) == value, "byte by byte as whole");
+    require(readInPieces(text, seed, 7) == value, "in short pieces as whole");
+    require(readInPieces(text, seed, 100) == value, "in long pieces as whole");
+    if (!value) return 0;
+
+    require(!value.description().empty(), "a value has a description");
+    const PropertyValue expected = normalForm(value);
+    const std::string compact = Vexa::writeJson(value, JsonWriter::Style::Compact);
+    require(Vexa::readJson(compact) == expected, "what is written reads back");
+    require(Vexa::readJson(Vexa::writeJson(value)) == expected, "indented as on one line");
+    require(Vexa::writeJson(expected, JsonWriter::Style::Compact) == compact,
+            "written twice the same");
+    return 0;
+}
