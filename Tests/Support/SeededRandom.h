@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <iterator>
 
 namespace VexaTouch::Testing {
 
@@ -27,7 +28,7 @@ public:
     bool oneIn(int n) { return between(1, n) == 1; }
     template <typename List>
     const auto& oneOf(const List& list) {
-        return list[next() % list.size()];
+        return list[next() % std::size(list)];
     }
 
 private:
