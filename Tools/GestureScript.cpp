@@ -356,6 +356,18 @@ const GestureCommandInfo& commandOf(Line& line) {
     line.fail(text + ", found " + quoted(name));
 }
 
+/// The sentence in lines of a terminal's width, indented below its command.
+void appendWrapped(std::string& text, std::string_view sentence) {
+    constexpr std::size_t kIndent = 6;
+    constexpr std::size_t kWidth = 72;
+    while (!sentence.empty()) {
+        const bool fits = sentence.size() <= kWidth;
+        const std::size_t end = fits ? sentence.size() : sentence.rfind(' ', kWidth);
+        text += std::string(kIndent, ' ') + std::string(sentence.substr(0, end)) + "\n";
+        sentence.remove_prefix(std::min(end + 1, sentence.size()));
+    }
+}
+
 std::string markdownCode(std::string_view text) {
     return "`" + std::string(text) + "`";
 }
@@ -401,12 +413,10 @@ std::string gestureUsage(const GestureCommandInfo& command) {
 }
 
 std::string gestureCommandHelp() {
-    constexpr std::size_t kColumn = 36;
     std::string text;
     for (const GestureCommandInfo& command : kGestureCommands) {
-        std::string usage = "  " + gestureUsage(command);
-        usage.resize(std::max(usage.size() + 1, kColumn), ' ');
-        text += usage + std::string(command.help) + "\n";
+        text += "  " + gestureUsage(command) + "\n";
+        appendWrapped(text, command.help);
     }
     return text;
 }

@@ -267,7 +267,7 @@ std::uint64_t imagesIn(std::uint64_t durationMs, std::uint64_t rate) noexcept;
 
 /// The command with its parameters: "tap PLACE [DURATION] [STRENGTH]".
 std::string gestureUsage(const GestureCommandInfo& command);
-/// A line a command, for a terminal.
+/// All commands with what they do, in lines for a terminal, each indented by two spaces or more.
 std::string gestureCommandHelp();
 /// The same as a Markdown table.
 std::string gestureCommandMarkdown();

@@ -27,7 +27,7 @@ private:
     void writeNext() {
         const std::uint32_t chance = random_.below(100);
         if (chance < 34) {
-            touchAt("tap ", 60, 320);
+            touchAt("tap ", 60, random_.below(4) == 0 ? 520 : 240);
         } else if (chance < 50) {
             touchAt("hold ", 560, 1800);
         } else if (chance < 60) {
@@ -41,7 +41,9 @@ private:
             const std::string where = place();
             touch("hover " + where, milliseconds(100, 600), false);
         } else if (chance < 90) {
-            line("idle", pass(milliseconds(50, 900)));
+            line("idle", pass(milliseconds(100, 2500)));
+        } else if (chance < 92) {
+            blur();
         } else if (chance < 96) {
             changeHand();
         } else {
@@ -61,6 +63,16 @@ private:
         }
         pass(liftoffMs_ + kDefaultGapMs);
         line("release");
+    }
+
+    /// What the algorithm should take neither for a hold nor for a tap.
+    void blur() {
+        if (random_.below(2) == 0) {
+            touch("hold C4", milliseconds(600, 1200), false);  // between the buttons
+        } else {
+            line("tap K " + std::to_string(pass(milliseconds(450, 500))) + "ms 220");  // too weak
+            pass(kDefaultGapMs);
+        }
     }
 
     /// Another finger, or the same in another mood.

@@ -1,6 +1,7 @@
 #include "Tools/SurfaceSynthesizer.h"
 
 #include <algorithm>
+#include <cstring>
 #include <utility>
 
 namespace VexaTouch::Tools {
@@ -53,18 +54,19 @@ SurfacePlace between(SurfacePlace from, SurfacePlace to, std::uint32_t part) {
     return {between(from.x, to.x, part), between(from.y, to.y, part)};
 }
 
-template <typename Number>
-void append(std::vector<std::uint8_t>& bytes, Number value) {
-    for (std::size_t i = 0; i < sizeof value; ++i) {
-        bytes.push_back(static_cast<std::uint8_t>(value >> (8U * i)));
-    }
+/// The report's bytes: its id, then the structure, which is the wire's own layout.
+template <typename Report>
+std::vector<std::uint8_t> bytesOf(const Report& report) {
+    std::vector<std::uint8_t> bytes(Report::minimumLength);
+    bytes[0] = Report::reportId;
+    std::memcpy(bytes.data() + 1, &report, sizeof report);
+    return bytes;
 }
 
 std::vector<std::uint8_t> firmwareReport(std::uint8_t code, const std::vector<std::uint8_t>& data) {
-    std::vector<std::uint8_t> report = {InputReport::FirmwareEvent::reportId, code};
-    report.insert(report.end(), data.begin(), data.end());
-    report.resize(InputReport::FirmwareEvent::minimumLength);
-    return report;
+    InputReport::FirmwareEvent event{code, {}};
+    std::copy_n(data.begin(), std::min(data.size(), event.data.size()), event.data.begin());
+    return bytesOf(event);
 }
 
 PipelineRecording::Frame reportFrame(std::vector<std::uint8_t> report) {
@@ -272,28 +274,20 @@ void SurfaceSynthesizer::sendImage(const SurfaceContact* contact, std::uint32_t 
     if (contact) {
         values = footprint(*contact, level);
     }
-    std::array<std::int16_t, kPixelCount> signedPixels;
+    InputReport::Image image{};
+    image.frameNumber = frameNumber_++;
+    image.timestampMs = deviceMs();
+    std::int32_t baseline = kRawBaseline;
     for (std::size_t i = 0; i < kPixelCount; ++i) {
         const std::int64_t raw = values[i] * kGainScale / kDecimalGains[i];
-        signedPixels[i] =
-            static_cast<std::int16_t>(clampedTo16Bits(raw + zero_[i] + random_.around0(noise_)));
-    }
-    std::vector<std::uint8_t> report;
-    report.reserve(InputReport::Image::minimumLength);
-    report.push_back(InputReport::Image::reportId);
-    append(report, frameNumber_++);
-    append(report, deviceMs());
-    append(report, std::uint32_t{0});  // the reserved bytes
-    for (std::size_t i = 0; i < kPixelCount; ++i) {
-        const std::int32_t baseline = kRawBaseline + kRawBaselineStep * static_cast<int>(i);
-        append(report, static_cast<std::uint16_t>(std::max(baseline + signedPixels[i], 0)));
-    }
-    for (const std::int16_t value : signedPixels) {
-        append(report, static_cast<std::uint16_t>(value));
+        const std::int32_t sample = clampedTo16Bits(raw + zero_[i] + random_.around0(noise_));
+        image.signedPixels[i] = static_cast<std::int16_t>(sample);
+        image.unsignedPixels[i] = static_cast<std::uint16_t>(std::max(baseline + sample, 0));
+        baseline += kRawBaselineStep;
     }
     const auto jitterBound =
         static_cast<std::uint32_t>(std::min(periodNs_ / 8, kLargestJitterNs)) + 1;
-    send(reportFrame(std::move(report)), kStartNs + elapsedNs_ + random_.below(jitterBound));
+    send(reportFrame(bytesOf(image)), kStartNs + elapsedNs_ + random_.below(jitterBound));
     elapsedNs_ += periodNs_;
 }
 
