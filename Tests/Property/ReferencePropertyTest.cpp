@@ -235,9 +235,10 @@ struct SameContent {
         a._peakProgress = b._peakProgress = number();
         a._valleyProgress = b._valleyProgress = number();
         a._isActive = b._isActive = random.oneIn(4);
-        a._isAboveNoise = b._isAboveNoise = random.oneIn(4);
-        a._wasAboveNoise = b._wasAboveNoise = random.oneIn(2);
-        a._wasActive = b._wasActive = random.oneIn(4);
+        // A pixel's own flags always agree with its value and with each other.
+        a._isAboveNoise = b._isAboveNoise = a._value > 75;
+        a._wasAboveNoise = b._wasAboveNoise = a._isAboveNoise || random.oneIn(2);
+        a._wasActive = b._wasActive = a._isActive || random.oneIn(4);
         a._maxProgressAboveNoise = b._maxProgressAboveNoise =
             random.oneIn(3) ? static_cast<float>(random.between(0, 3)) : level();
         a._index = b._index = index;
