@@ -258,7 +258,9 @@ struct SameContent {
                 if constexpr (std::same_as<Field, bool>) {
                     field = boolean();
                 } else if constexpr (std::same_as<Field, float>) {
-                    field = name == "_y_cutoff" ? 7.389056F : number();
+                    field = name == "_y_cutoff"              ? 7.389056F
+                            : name == "_peak_pixel_progress" ? level()
+                                                             : number();
                 } else if constexpr (std::same_as<Field, std::uint32_t>) {
                     field = time();
                 } else if (name == "_peak_pixel_index") {
