@@ -2,6 +2,7 @@
 
 #include "Tools/DiffCommand.h"
 #include "Tools/ReplayCommand.h"
+#include "Tools/SynthCommand.h"
 
 #include <algorithm>
 #include <array>
@@ -10,21 +11,14 @@
 namespace VexaTouch::Tools {
 namespace {
 
-constexpr std::array<ExitCodeEntry, 3> kUsualExitCodes = {{
-    {kExitSuccess, "done"},
-    {kExitFailure, "failed; one line on standard error says with what and why"},
-    {kExitUsage, "the command line is wrong"},
-}};
-
 // The order is that of the help text.
 constexpr std::array kCommands = {
     &replayCommand,
+    &synthCommand,
     &diffCommand,
 };
 
 }  // namespace
-
-constinit const std::span<const ExitCodeEntry> usualExitCodes = kUsualExitCodes;
 
 std::span<const Command* const> commandTable() {
     return kCommands;

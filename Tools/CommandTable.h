@@ -2,6 +2,7 @@
 
 #include "Tools/Streams.h"
 
+#include <array>
 #include <map>
 #include <span>
 #include <string>
@@ -89,7 +90,11 @@ struct Command {
 };
 
 /// Exit codes of a subcommand that has nothing special to say.
-extern const std::span<const ExitCodeEntry> usualExitCodes;
+inline constexpr std::array<ExitCodeEntry, 3> usualExitCodes = {{
+    {kExitSuccess, "done"},
+    {kExitFailure, "failed; one line on standard error says with what and why"},
+    {kExitUsage, "the command line is wrong"},
+}};
 
 /// All subcommands in the order of the help text.
 std::span<const Command* const> commandTable();

@@ -10,7 +10,8 @@
 #include <algorithm>
 #include <array>
 #include <cstdint>
-#include <optional>
+#include <list>
+#include <span>
 #include <string>
 #include <utility>
 #include <vector>
@@ -63,7 +64,7 @@ constexpr std::array<ExampleEntry, 3> kExamples = {{
 constexpr std::string_view kDescription =
     "Replays A and B side by side and compares, frame by frame, what each frame was, its events "
     "and every field of the algorithm's state after it. Printed are the first frame that differs "
-    "with all its differing fields, then for each field the number of frames on which it differs. "
+    "with its fields that do, then for each field the number of frames on which it differs. "
     "Frames are paired by their place in the recording.\n"
     "\n"
     "Fields are named as in the output of replay --trace: pixels[A]._progress, "
@@ -71,6 +72,9 @@ constexpr std::string_view kDescription =
 
 constexpr std::string_view kEventsField = "events";
 constexpr std::string_view kMissingField = "(no such frame)";
+
+/// Fields of the first frame that differs that are printed for a person; --json has them all.
+constexpr std::size_t kFieldsShown = 12;
 
 struct FieldDifference {
     std::string field;
@@ -198,9 +202,14 @@ void printText(const Comparison& comparison, Streams& streams) {
         return field;
     };
     streams.out << "First difference at frame index " << comparison.firstIndex << ":\n";
-    for (const FieldDifference& difference : comparison.first) {
+    const std::size_t shown = std::min(comparison.first.size(), kFieldsShown);
+    for (const FieldDifference& difference : std::span(comparison.first).first(shown)) {
         streams.out << "  " << padded(difference.field) << "  " << difference.a << " | "
                     << difference.b << '\n';
+    }
+    if (shown < comparison.first.size()) {
+        streams.out << "  and " << comparison.first.size() - shown
+                    << " more fields of that frame\n";
     }
     streams.out << "Frames that differ, by field:\n";
     for (const auto& [field, count] : comparison.counts) {

@@ -140,25 +140,6 @@ RecordingFile readRecording(const std::string& path, Streams& streams) {
     return file;
 }
 
-RecoveredRecording recoverRecording(const std::string& path, Streams& streams) {
-    RecoveredRecording recovered;
-    recovered.file.name = path == "-" ? "standard input" : path;
-    ByteSource source(path, streams);
-    ContainerReader reader;
-    recovered.file.textBytes = feed(reader, source, streams);
-    try {
-        recovered.file.frames = reader.finish();
-    } catch (const std::bad_alloc&) {
-        throw;
-    } catch (const std::exception& fault) {
-        recovered.damage = faultText(reader, recovered.file.textBytes, fault);
-        recovered.damageOffset = reader.errorOffset();
-        recovered.file.frames = reader.recover();
-    }
-    recovered.file.version = reader.version().value_or(0);
-    return recovered;
-}
-
 void writeRecording(const std::list<PipelineRecording::Frame>& frames, const std::string& path,
                     Streams& streams) {
     OutputFile file(path, streams);

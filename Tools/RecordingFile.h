@@ -6,7 +6,6 @@
 
 #include <cstdint>
 #include <list>
-#include <optional>
 #include <string>
 
 namespace VexaTouch::Tools {
@@ -19,21 +18,10 @@ struct RecordingFile {
     std::uint64_t textBytes = 0;  ///< size of the text that was read
 };
 
-/// What could be saved of a damaged recording.
-struct RecoveredRecording {
-    RecordingFile file;
-    std::string damage;                         ///< what was wrong, empty when nothing was
-    std::optional<std::uint64_t> damageOffset;  ///< in bytes, when the text itself is damaged
-};
-
 /// Reads a recording from a path, or from the input stream for "-", piece by piece: the text is
 /// never in memory as a whole. Throws Failure with one line that names the file, what was wrong and
 /// where.
 RecordingFile readRecording(const std::string& path, Streams& streams);
-
-/// Reads every whole frame of a file that may be damaged or cut off. Throws Failure only when the
-/// file cannot be read at all.
-RecoveredRecording recoverRecording(const std::string& path, Streams& streams);
 
 /// Writes a version-1 container to a path, or to the result stream for "-". The file appears whole
 /// or not at all. Throws Failure.
