@@ -24,7 +24,8 @@ endif()
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_LESS 13)
     # g++ 12 sees overlaps and overruns inside its own library's inlined string and vector code
     # (GCC bugs 105329 and 105651). clang and the address sanitizer look at the same code.
-    add_compile_options(-Wno-restrict -Wno-array-bounds -Wno-stringop-overflow)
+    add_compile_options(-Wno-restrict -Wno-array-bounds -Wno-stringop-overflow
+                        -Wno-stringop-overread)
 endif()
 if(VEXA_WERROR)
     add_compile_options(-Werror)
