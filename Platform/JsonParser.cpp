@@ -36,11 +36,9 @@ bool isLargeNumber(std::string_view text) {
         std::string_view digits = text.substr(exponentAt + 1);
         const bool isNegative = digits.front() == '-';
         if (isNegative || digits.front() == '+') digits.remove_prefix(1);
+        // At most 19 digits, see resumeAfterExponentOverflow.
         std::int64_t exponent = 0;
-        const auto result = std::from_chars(digits.data(), digits.data() + digits.size(), exponent);
-        // Half the range, so that adding the power of the mantissa cannot overflow.
-        constexpr std::int64_t kHuge = std::numeric_limits<std::int64_t>::max() / 2;
-        if (result.ec == std::errc::result_out_of_range || exponent > kHuge) exponent = kHuge;
+        std::from_chars(digits.data(), digits.data() + digits.size(), exponent);
         power += isNegative ? -exponent : exponent;
     }
     return power >= 0;
@@ -242,7 +240,9 @@ struct JsonParser::State {
         while (begin > 0 && kNumberCharacters.find(readBefore[begin - 1]) != std::string_view::npos)
             --begin;
         EventForwarder& forwarder = parser.handler();
-        const double value = outOfRangeValue(forwarder.takeNumberText(readBefore.substr(begin)));
+        // Digits of the exponent may follow. These stand for them: they outweigh any mantissa.
+        const double value =
+            outOfRangeValue(forwarder.takeNumberText(readBefore.substr(begin)) + "999999999");
         const std::string replay = forwarder.openingText() + "0e0";
 
         SilentHandler silent;

@@ -30,7 +30,8 @@ public:
     bool write(std::string_view piece);
     /// Ends the text; true when it was one whole value.
     bool finish();
-    /// Bytes read before the fault, once write or finish returned false.
+    /// Bytes read before the fault, once write or finish returned false; within one character,
+    /// escape or literal it may depend on how the text was cut.
     [[nodiscard]] std::uint64_t errorOffset() const noexcept;
     /// What was wrong, once write or finish returned false; empty before.
     [[nodiscard]] std::string errorMessage() const;

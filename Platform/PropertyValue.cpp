@@ -384,9 +384,8 @@ private:
         switch (a.type()) {
             case Type::None:
             case Type::Null:
-                return true;
             case Type::Boolean:
-                return a.toBoolean() == b.toBoolean();
+                return false;  // one node for each value, and these are not the same
             case Type::Signed:
             case Type::Unsigned:
                 return areIntegersEqual(a, b);

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdint>
 #include <cstdlib>
 #include <limits>
 #include <ostream>
@@ -176,7 +177,11 @@ TEST(JsonParserTest, TheAnswerDoesNotDependOnTheCut) {
             const std::string_view view = text;
             Outcome parts = read({view.substr(0, cut), view.substr(cut)});
             // The library names a broken character where its last piece ends.
-            if (!whole.isRead) parts.errorOffset = whole.errorOffset;
+            // Within one character, escape or literal the place of a fault depends on the cut.
+            const auto distance = static_cast<std::int64_t>(parts.errorOffset - whole.errorOffset);
+            EXPECT_LE(std::abs(distance), 6) << text << " cut at " << cut;
+            EXPECT_EQ(parts.errorMessage.empty(), whole.isRead) << text << " cut at " << cut;
+            parts.errorOffset = whole.errorOffset;
             parts.errorMessage = whole.errorMessage;
             EXPECT_EQ(parts, whole) << text << " cut at " << cut;
         }

@@ -214,6 +214,22 @@ TEST(PropertyValueTest, IntegersCompareByValueAcrossSignTypes) {
     EXPECT_FALSE(PropertyValue(1) == PropertyValue(true));
 }
 
+TEST(PropertyValueTest, NullsAndBooleansCompareByValue) {
+    EXPECT_EQ(PropertyValue(true), PropertyValue(true));
+    EXPECT_EQ(PropertyValue(false), PropertyValue(false));
+    EXPECT_FALSE(PropertyValue(true) == PropertyValue(false));
+    EXPECT_EQ(PropertyValue::null(), PropertyValue::null());
+    EXPECT_EQ(PropertyValue(), PropertyValue());
+}
+
+TEST(PropertyValueTest, TextAndBytesCompareByContent) {
+    EXPECT_EQ(PropertyValue("a"), PropertyValue("a"));
+    EXPECT_FALSE(PropertyValue("a") == PropertyValue("b"));
+    EXPECT_EQ(PropertyValue(PropertyValue::Bytes{1, 2}), PropertyValue(PropertyValue::Bytes{1, 2}));
+    EXPECT_FALSE(PropertyValue(PropertyValue::Bytes{1, 2}) ==
+                 PropertyValue(PropertyValue::Bytes{1, 3}));
+}
+
 TEST(PropertyValueTest, FloatingPointNumbersCompareByTheirBitsAsDoubles) {
     EXPECT_EQ(PropertyValue(0.5f), PropertyValue(0.5));
     EXPECT_FALSE(PropertyValue(0.1f) == PropertyValue(0.1));
