@@ -83,7 +83,7 @@ std::string describe(const GestureParameter& parameter) {
         case Kind::Key:
             return "a setting's key such as HoldTimeoutMilliseconds";
         case Kind::Json:
-            return "a JSON value up to the end of the line";
+            return "a JSON value";
         case Kind::Bytes:
             return "bytes as pairs of hexadecimal digits, at most " +
                    std::to_string(parameter.highest);
@@ -109,7 +109,19 @@ public:
         skipBlanks();
         return token;
     }
-    std::string_view takeRest() { return std::exchange(rest_, {}); }
+    /// The rest up to a comment; a `#` in a JSON string begins none.
+    std::string_view takeJson() {
+        bool inString = false;
+        std::size_t end = 0;
+        for (; end < rest_.size() && (inString || rest_[end] != '#'); ++end) {
+            if (rest_[end] == '"') {
+                inString = !inString;
+            } else if (inString && rest_[end] == '\\') {
+                ++end;
+            }
+        }
+        return std::exchange(rest_, {}).substr(0, end);
+    }
     [[nodiscard]] std::size_t number() const { return number_; }
 
     [[noreturn]] void fail(const std::string& text) const {
@@ -203,7 +215,7 @@ std::string takeKey(Line& line, const GestureCommandInfo& info, const GesturePar
 
 Vexa::PropertyValue takeJson(Line& line, const GestureCommandInfo& info,
                              const GestureParameter& parameter) {
-    const std::string_view text = line.takeRest();
+    const std::string_view text = line.takeJson();
     Vexa::PropertyValue value = Vexa::readJson(text);
     if (!value) {
         failExpecting(line, info, parameter, text);

@@ -211,7 +211,7 @@ inline constexpr std::array<GestureCommandInfo, 25> kGestureCommands = {{
     {GestureKind::Set,
      "set",
      {{{Detail::Kind::Key, "KEY"}, {Detail::Kind::Json, "JSON"}}},
-     "A change of an algorithm setting; the value runs to the end of the line.",
+     "A change of an algorithm setting, which takes effect at the next image.",
      "set HoldTimeoutMilliseconds 300"},
     {GestureKind::Clock,
      "clock",
