@@ -1,7 +1,10 @@
 #include "Tools/CommandTable.h"
 
+#include "Tools/ConvertCommand.h"
 #include "Tools/DiffCommand.h"
+#include "Tools/InfoCommand.h"
 #include "Tools/ReplayCommand.h"
+#include "Tools/ShowCommand.h"
 #include "Tools/SynthCommand.h"
 
 #include <algorithm>
@@ -13,9 +16,7 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &replayCommand,
-    &synthCommand,
-    &diffCommand,
+    &replayCommand, &infoCommand, &showCommand, &convertCommand, &synthCommand, &diffCommand,
 };
 
 }  // namespace
