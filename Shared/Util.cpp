@@ -6,6 +6,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdio>
+#include <cstdlib>
 #include <stdexcept>
 
 namespace VexaTouch::Util {
@@ -147,7 +148,7 @@ void appendPixelValue(std::string& line, std::intmax_t value, int runLength) {
     std::array<char, 24> number{};
     const int length = std::snprintf(number.data(), number.size(), "%*jd", field, value);
     line.append(number.data(), static_cast<std::size_t>(length));
-    line.append(static_cast<std::size_t>(std::max(length - field, field - length)), ' ');
+    line.append(static_cast<std::size_t>(std::abs(runLength - length)), ' ');
 }
 
 std::string imageLine(ImageRow row, const InputReport::Image& image, bool showUnsigned) {
