@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <bit>
-#include <limits>
+#include <span>
 
 namespace VexaTouch {
 
@@ -25,14 +25,9 @@ Vexa::HidEvent createEvent(std::uint32_t eventMask, PixelRegion region, Vexa::Hi
     return event;
 }
 
-/// The low 16 bits as a signed number: a group of very strong pixels deliberately wraps.
-constexpr int cutTo16Bits(std::int32_t value) noexcept {
-    return static_cast<std::int16_t>(static_cast<std::uint16_t>(value));
-}
-
 }  // namespace
 
-Algs::Algs() : quietThreshold_(std::numeric_limits<float>::quiet_NaN()) {
+Algs::Algs() {
     _touchPixels.reserve(kPixelCount);
     for (std::size_t i = 0; i < kPixelCount; ++i) {
         _touchPixels.emplace_back(static_cast<int>(i), kPixelGains[i]);
@@ -60,10 +55,9 @@ std::vector<Vexa::HidEvent> Algs::handleReset() {
 
 void Algs::processTouchFrame(const std::int16_t* samples, std::uint32_t frameNumber,
                              std::uint32_t timeMs, std::vector<Vexa::HidEvent>& events) {
-    updatePixels(samples);
-    _virtual_image.updateValues(_touchPixels);
-    updateVirtualPixels();
-    _handStats.updateHandState(_touchPixels, _virtualPixels, timeMs);
+    ChannelUpdate update(_handStats._activationThreshold);
+    updateChannels(samples, update);
+    _handStats.updateHandState(_touchPixels, _virtualPixels, update.summarize(), timeMs);
     decideEvent(frameNumber, events);
     _EventStats.update(_handStats);
     if (_log.isEnabled(Vexa::LogLevel::Debug)) {
@@ -71,30 +65,43 @@ void Algs::processTouchFrame(const std::int16_t* samples, std::uint32_t frameNum
     }
 }
 
-void Algs::updatePixels(const std::int16_t* samples) noexcept {
-    const float threshold = _handStats._activationThreshold;
-    for (std::size_t i = 0; i < kPixelCount; ++i) {
-        _touchPixels[i].updatePixelState(samples[i], threshold);
-    }
-}
+void Algs::updateChannels(const std::int16_t* samples, ChannelUpdate& update) {
+    update.updatePixels(std::span<Pixel, kPixelCount>(_touchPixels),
+                        std::span<const std::int16_t, kPixelCount>(samples, kPixelCount));
+    const std::int32_t neverActive = update.neverActive();
+    const bool anyAboveNoise =
+        _virtual_image.updateValues(std::span(update.values()).subspan<0, kPixelCount>());
 
-void Algs::updateVirtualPixels() {
     const float threshold = _handStats._activationThreshold;
     const bool sameThreshold =
         std::bit_cast<std::uint32_t>(threshold) == std::bit_cast<std::uint32_t>(quietThreshold_);
-    const std::size_t groups = _virtual_image.neighborPixelGroups().size();
-    for (std::size_t i = 0; i < groups; ++i) {
-        const int sample = cutTo16Bits(_virtual_image._values.at(i));
-        VirtualPixel& pixel = _virtualPixels.at(i);
-        const std::int32_t strongest = _virtual_image._maxPixelIndex.at(i);
-        const bool quiet = sample == 0 && pixel._value == 0 && !pixel._isActive && sameThreshold;
-        if (quiet) {
-            pixel._index = strongest;
-        } else {
-            pixel.updatePixelState(sample, threshold, strongest);
-        }
+    if (!anyAboveNoise && virtualPixelsQuiet_ && sameThreshold) {
+        update.keepVirtualPixels(quietNeverActive_);
+        return;
     }
-    quietThreshold_ = threshold;
+    virtualPixelsQuiet_ = false;
+    if (_virtualPixels.size() < kVirtualPixelCount ||
+        _virtual_image._values.size() < kVirtualPixelCount ||
+        _virtual_image._maxPixelIndex.size() < kVirtualPixelCount) {
+        throwAtMissingVirtualPixel();
+    }
+    update.updateVirtualPixels(
+        std::span(_virtualPixels).first<kVirtualPixelCount>(),
+        std::span(_virtual_image._values).first<kVirtualPixelCount>(),
+        std::span(_virtual_image._maxPixelIndex).first<kVirtualPixelCount>());
+    if (!anyAboveNoise && !update.anyActive()) {
+        virtualPixelsQuiet_ = true;
+        quietThreshold_ = threshold;
+        quietNeverActive_ = update.neverActive() - neverActive;
+    }
+}
+
+void Algs::throwAtMissingVirtualPixel() {
+    for (std::size_t i = 0;; ++i) {
+        const auto sample = static_cast<std::int16_t>(_virtual_image._values.at(i));
+        _virtualPixels.at(i).updatePixelState(sample, _handStats._activationThreshold,
+                                              _virtual_image._maxPixelIndex.at(i));
+    }
 }
 
 void Algs::decideEvent(std::uint32_t frameNumber, std::vector<Vexa::HidEvent>& events) {
@@ -137,6 +144,7 @@ void Algs::Reset() noexcept {
         pixel.resetGlobalStats();
     }
     _handStats.Reset();
+    quietNeverActive_ = 0;
 }
 
 Vexa::HidEvent Algs::createMayBeginEvent(PixelRegion region) {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "Algorithm/ChannelUpdate.h"
 #include "Algorithm/EventStats.h"
 #include "Algorithm/HandStats.h"
 #include "Algorithm/Pixel.h"
@@ -85,16 +86,19 @@ protected:
     std::uint16_t _lastDispatchedPhase = 0;
 
 private:
-    void updatePixels(const std::int16_t* samples) noexcept;
-    void updateVirtualPixels();
+    void updateChannels(const std::int16_t* samples, ChannelUpdate& update);
+    /// Updates the virtual pixels up to the one that lacks an element, and throws.
+    [[noreturn]] void throwAtMissingVirtualPixel();
     void decideEvent(std::uint32_t frameNumber, std::vector<Vexa::HidEvent>& events);
     void logFrame(const std::int16_t* samples, std::uint32_t frameNumber,
                   std::uint32_t timeMs) const;
     [[nodiscard]] std::string describeFrame(const std::string& channels, unsigned int timeMs) const;
 
-    // Threshold that the last update of the virtual pixels used: while it stays, a virtual pixel
-    // that is inactive at value 0 and gets sample 0 again cannot change.
-    float quietThreshold_;
+    // A virtual pixel that was left inactive at value 0 cannot change by another sample of 0 at the
+    // same threshold. Most frames are of this kind.
+    bool virtualPixelsQuiet_ = false;
+    float quietThreshold_ = 0.0F;
+    std::int32_t quietNeverActive_ = 0;  // of the virtual pixels, see ChannelSummary
 };
 
 }  // namespace VexaTouch

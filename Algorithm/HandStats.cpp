@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cmath>
-#include <stdexcept>
 
 namespace VexaTouch {
 
@@ -17,9 +16,20 @@ PixelRegion regionAt(const std::vector<Pixel>& pixels, int index) noexcept {
     return pixels[static_cast<std::size_t>(index)].getPixelRegion();
 }
 
-/// A channel that rose above noise during the touch but never became active.
-bool staysNoise(const Pixel& channel) noexcept {
-    return channel._wasAboveNoise && !channel._wasActive;
+/// `_index` of the channel of highest progress above 0, or 0; the earlier channel wins a tie.
+std::int32_t strongestChannelIndex(const std::vector<Pixel>& pixels,
+                                   const std::vector<VirtualPixel>& virtualPixels) noexcept {
+    float strongest = 0.0F;
+    std::int32_t index = 0;
+    const auto look = [&](const Pixel& channel) {
+        if (channel._progress > strongest) {
+            strongest = channel._progress;
+            index = channel._index;
+        }
+    };
+    std::ranges::for_each(pixels, look);
+    std::ranges::for_each(virtualPixels, look);
+    return index;
 }
 
 struct TopTwo {
@@ -48,14 +58,6 @@ TopTwo topTwoAboveNoise(const std::vector<Pixel>& pixels) noexcept {
 
 }  // namespace
 
-/// What one look at all channels tells.
-struct HandStats::Channels {
-    bool anyActive = false;
-    bool anyAboveNoise = false;
-    float strongestProgress = 0.0F;
-    std::int32_t strongestIndex = 0;  ///< `_index` of the channel of highest progress above 0
-};
-
 void HandStats::SetDecayParameters() noexcept {
     _y_cutoff = kDefaultCutoff;
 }
@@ -70,15 +72,25 @@ void HandStats::Reset() noexcept {
 void HandStats::updateHandState(const std::vector<Pixel>& pixels,
                                 const std::vector<VirtualPixel>& virtualPixels,
                                 unsigned int timeMs) {
-    const Channels channels = scanChannels(pixels, virtualPixels);
+    updateHandState(pixels, virtualPixels, ChannelSummary::of(pixels, virtualPixels), timeMs);
+}
+
+void HandStats::updateHandState(const std::vector<Pixel>& pixels,
+                                const std::vector<VirtualPixel>& virtualPixels,
+                                const ChannelSummary& channels, unsigned int timeMs) {
+    if (channels.anyActive) {
+        std::ranges::for_each(pixels, [this](const Pixel& pixel) { trackPeak(pixel); });
+        std::ranges::for_each(virtualPixels, [this](const Pixel& pixel) { trackPeak(pixel); });
+    }
     shiftTouchFlags(channels);
     if (_isTouching) {
-        _activeRegion = _isHolding ? changeActiveRegion(pixels, channels.strongestIndex)
-                                   : updateActiveRegion(pixels, virtualPixels, timeMs);
+        _activeRegion =
+            _isHolding ? changeActiveRegion(pixels, strongestChannelIndex(pixels, virtualPixels))
+                       : updateActiveRegion(pixels, virtualPixels, timeMs);
     }
     stampEdges(timeMs);
-    updateTouchScore(pixels, virtualPixels, timeMs);
-    updateTapRejection(pixels, virtualPixels);
+    updateTouchScore(channels, timeMs);
+    updateTapRejection(channels);
 
     _wasHolding = _isHolding;
     _wouldBeWasHolding = _wouldBeIsHolding;
@@ -93,41 +105,19 @@ void HandStats::updateHandState(const std::vector<Pixel>& pixels,
     }
 }
 
-HandStats::Channels HandStats::scanChannels(const std::vector<Pixel>& pixels,
-                                            const std::vector<VirtualPixel>& virtualPixels) {
-    Channels channels;
-    const auto look = [&](const Pixel& channel) {
-        const float progress = largerOrOld(channel._progress, 0.0F);
-        channels.anyAboveNoise |= channel._isAboveNoise;
-        if (channel._isActive) {
-            channels.anyActive = true;
-            if (progress > _peak_pixel_progress) {
-                _peak_pixel_progress = progress;
-                _peak_pixel_index = channel._index;
-            }
-        }
-        if (progress > channels.strongestProgress) {
-            channels.strongestProgress = progress;
-            channels.strongestIndex = channel._index;
-        }
-    };
-    for (const Pixel& pixel : pixels) {
-        look(pixel);
+void HandStats::trackPeak(const Pixel& channel) noexcept {
+    if (channel._isActive && channel._progress > _peak_pixel_progress) {
+        // The peak starts at 0, so a progress that is negative or no number never sets it.
+        _peak_pixel_progress = channel._progress;
+        _peak_pixel_index = channel._index;
     }
-    for (const VirtualPixel& pixel : virtualPixels) {
-        look(pixel);
-    }
-    if (virtualPixels.size() < kVirtualPixelCount) {
-        throw std::out_of_range("a virtual pixel is missing");
-    }
-    return channels;
 }
 
-void HandStats::shiftTouchFlags(const Channels& channels) noexcept {
+void HandStats::shiftTouchFlags(const ChannelSummary& channels) noexcept {
     _wasTouching = _isTouching;
     _isTouching = channels.anyActive;
     _wasAboveNoiseLevel = _isAboveNoiseLevel;
-    _isAboveNoiseLevel = channels.anyAboveNoise;
+    _isAboveNoiseLevel = channels.aboveNoise != 0;
 }
 
 void HandStats::stampEdges(unsigned int timeMs) noexcept {
@@ -171,7 +161,11 @@ void HandStats::decideTap(bool wouldHaveHeld) noexcept {
 void HandStats::updateTouchScore(const std::vector<Pixel>& pixels,
                                  const std::vector<VirtualPixel>& virtualPixels,
                                  unsigned int timeMs) {
-    _svm.updateSVMScore(pixels, virtualPixels, _activationThreshold, timeMs);
+    updateTouchScore(ChannelSummary::of(pixels, virtualPixels), timeMs);
+}
+
+void HandStats::updateTouchScore(const ChannelSummary& channels, unsigned int timeMs) noexcept {
+    _svm.updateSVMScore(channels, _activationThreshold);
     if (_isAboveNoiseLevel && !_wasAboveNoiseLevel && _touch_score != 0.0F) {
         decayTouchScore(timeMs);
     }
@@ -194,6 +188,10 @@ void HandStats::decayTouchScore(unsigned int timeMs) noexcept {
 
 void HandStats::updateTapRejection(const std::vector<Pixel>& pixels,
                                    const std::vector<VirtualPixel>& virtualPixels) {
+    updateTapRejection(ChannelSummary::of(pixels, virtualPixels));
+}
+
+void HandStats::updateTapRejection(const ChannelSummary& channels) noexcept {
     _max_pixel_value = _peak_pixel_progress * _activationThreshold;
     // Unsigned 32-bit numbers compare in double as they do as integers.
     const std::uint32_t sinceQuiet = std::min(_liftoffTimestamp_ms - _aboveNoiseTimestamp_ms,
@@ -212,12 +210,8 @@ void HandStats::updateTapRejection(const std::vector<Pixel>& pixels,
             _max_pixel_value / static_cast<float>(touchDuration) - 0.65F;
     }
 
-    if (virtualPixels.size() < kVirtualPixelCount) {
-        throw std::out_of_range("a virtual pixel is missing");
-    }
-    const auto noisy = std::ranges::count_if(pixels, staysNoise) +
-                       std::ranges::count_if(virtualPixels, staysNoise);
-    _nonActivePixels_thresholded = 21 - static_cast<std::int32_t>(noisy);
+    // 22 channels of noise are more than any tap leaves behind.
+    _nonActivePixels_thresholded = 21 - channels.neverActive;
 
     _tap_svm_score = _signalDerivative_thresholded * 0.2772F +
                      _timeDurationRatio_thresholded * 2.7205F +

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "Algorithm/ChannelSummary.h"
 #include "Algorithm/SVM.h"
 
 #include <array>
@@ -28,6 +29,10 @@ public:
     /// update is then abandoned part-way.
     void updateHandState(const std::vector<Pixel>& pixels,
                          const std::vector<VirtualPixel>& virtualPixels, unsigned int timeMs);
+    /// The same for whoever has the summary of these very channels already.
+    void updateHandState(const std::vector<Pixel>& pixels,
+                         const std::vector<VirtualPixel>& virtualPixels,
+                         const ChannelSummary& channels, unsigned int timeMs);
 
     /// The region while touching but not holding.
     PixelRegion updateActiveRegion(const std::vector<Pixel>& pixels,
@@ -96,11 +101,10 @@ public:
     float _regionChangeThresh = 1.3F;  ///< last factor used by changeActiveRegion
 
 private:
-    struct Channels;
-
-    Channels scanChannels(const std::vector<Pixel>& pixels,
-                          const std::vector<VirtualPixel>& virtualPixels);
-    void shiftTouchFlags(const Channels& channels) noexcept;
+    void trackPeak(const Pixel& channel) noexcept;
+    void shiftTouchFlags(const ChannelSummary& channels) noexcept;
+    void updateTouchScore(const ChannelSummary& channels, unsigned int timeMs) noexcept;
+    void updateTapRejection(const ChannelSummary& channels) noexcept;
     void stampEdges(unsigned int timeMs) noexcept;
     void decideHold(bool timedOut, bool wasHolding) noexcept;
     void decideTap(bool wouldHaveHeld) noexcept;

@@ -1,6 +1,11 @@
 #include "Algorithm/SVM.h"
 
-#include <stdexcept>
+#include "Algorithm/SortNetwork.h"
+
+#include <algorithm>
+#include <bit>
+#include <cstdint>
+#include <limits>
 
 namespace VexaTouch {
 
@@ -31,55 +36,34 @@ constexpr SVM::Parameters SVM::_w = {
 void SVM::updateSVMScore(const std::vector<Pixel>& pixels,
                          const std::vector<VirtualPixel>& virtualPixels, float activationThreshold,
                          unsigned int /*timeMs*/) {
-    if (pixels.size() != kPixelCount || virtualPixels.size() != kVirtualPixelCount) {
-        throw std::out_of_range("the classifier needs 38 channels");
-    }
+    updateSVMScore(ChannelSummary::of(pixels, virtualPixels), activationThreshold);
+}
+
+void SVM::updateSVMScore(const ChannelSummary& channels, float activationThreshold) noexcept {
     _score = 0.0F;
-
-    Values values;
-    std::int32_t largest = pixels.front()._value;
-    int aboveNoise = 0;
-    const auto take = [&](std::size_t channel, std::int32_t value) {
-        values[channel] = value;
-        largest = value > largest ? value : largest;
-        aboveNoise += static_cast<int>(value > kNoiseLevel);
-    };
-    for (std::size_t i = 0; i < kPixelCount; ++i) {
-        take(i, pixels[i]._value);
-    }
-    for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
-        take(kPixelCount + i, virtualPixels[i]._value);
-    }
-
     // The second strongest is above noise exactly when two channels are.
-    if (!(static_cast<float>(largest) > activationThreshold || aboveNoise >= 2)) {
+    if (!(static_cast<float>(channels.largestValue) > activationThreshold ||
+          channels.aboveNoise >= 2)) {
         return;
     }
-    Values sorted;
-    sortDescending(values, sorted);
+    // Places that no channel takes sort behind all channels.
+    alignas(FloatLanes) std::array<float, 48> values;
+    values.fill(-std::numeric_limits<float>::infinity());
+    std::ranges::transform(channels.values, values.begin(),
+                           [](std::int32_t value) { return static_cast<float>(value); });
+    auto lanes = std::bit_cast<SortNetwork::Run<12>>(values);
+    SortNetwork::sortDescending(lanes);
+    values = std::bit_cast<std::array<float, 48>>(lanes);
+
     Parameters terms;
     for (std::size_t k = 0; k < kChannelCount; ++k) {
-        terms[k] = (static_cast<float>(sorted[k]) - _mu[k]) / _std_[k] * _w[k];
+        terms[k] = (values[k] - _mu[k]) / _std_[k] * _w[k];
     }
     float sum = 0.0F;
     for (const float term : terms) {
         sum += term;
     }
     _score = _b + sum;
-}
-
-void SVM::sortDescending(const Values& values, Values& sorted) noexcept {
-    for (std::size_t i = 0; i < kChannelCount; ++i) {
-        const std::uint8_t channel = order_[i];
-        const std::int32_t value = values[channel];
-        std::size_t place = i;
-        for (; place > 0 && sorted[place - 1] < value; --place) {
-            sorted[place] = sorted[place - 1];
-            order_[place] = order_[place - 1];
-        }
-        sorted[place] = value;
-        order_[place] = channel;
-    }
 }
 
 }  // namespace VexaTouch

@@ -1,7 +1,7 @@
 #include "Algorithm/VirtualImage.h"
 
 #include <algorithm>
-#include <bit>
+#include <stdexcept>
 
 namespace VexaTouch {
 
@@ -11,29 +11,35 @@ constexpr std::size_t pixelOfLetter(char letter) noexcept {
     return static_cast<std::size_t>(letter - 'A');
 }
 
-/// The pixel indices of a group as a bit mask: letters stand in ascending order in every group, so
-/// walking the bits upward walks the letters.
-constexpr std::array<std::uint32_t, kVirtualPixelCount> kGroupMasks = [] {
-    std::array<std::uint32_t, kVirtualPixelCount> masks{};
-    for (std::size_t i = 0; i < masks.size(); ++i) {
-        for (const char letter : kPixelGroups[i].letters) {
-            masks[i] |= 1U << pixelOfLetter(letter);
-        }
+/// No group has more members.
+constexpr std::size_t kMostMembers = 4;
+
+/// The members of each group in letter order; a place that is left over names a pixel that is not
+/// there and always counts as 0.
+constexpr std::size_t kNoPixel = kPixelCount;
+using Members = std::array<std::uint8_t, kMostMembers>;
+constexpr std::array<Members, kVirtualPixelCount> kGroupMembers = [] {
+    std::array<Members, kVirtualPixelCount> groups{};
+    for (std::size_t i = 0; i < groups.size(); ++i) {
+        groups[i].fill(kNoPixel);
+        std::ranges::transform(kPixelGroups[i].letters, groups[i].begin(), [](char letter) {
+            return static_cast<std::uint8_t>(pixelOfLetter(letter));
+        });
     }
-    return masks;
+    return groups;
 }();
 
-static_assert(std::ranges::all_of(kPixelGroups, [](const PixelGroup& group) {
-    return std::ranges::is_sorted(group.letters);
-}));
+[[noreturn]] void throwOutOfRange() {
+    throw std::out_of_range("a pixel or pixel group is missing");
+}
 
-/// Adds one member to its group's sum and lets it take over as the strongest.
-void addMember(std::int32_t pixel, std::int32_t value, std::int32_t strongestValue,
-               std::int32_t& sum, std::int32_t& strongest) noexcept {
-    sum += value;
-    if (value > strongestValue) {
-        strongest = pixel;
+/// Element of a list of any length.
+template <typename List>
+auto& elementAt(List& list, std::size_t index) {
+    if (index >= list.size()) {
+        throwOutOfRange();
     }
+    return list[index];
 }
 
 }  // namespace
@@ -50,40 +56,63 @@ VirtualImage::VirtualImage() : _values(kVirtualPixelCount, 0) {
 }
 
 void VirtualImage::updateValues(const std::vector<Pixel>& pixels) {
-    if (pixels.size() < kPixelCount || _values.size() < kVirtualPixelCount ||
-        _maxPixelIndex.size() < kVirtualPixelCount) {
-        updateValuesRangeTested(pixels);
-        return;
-    }
-    std::ranges::fill(_values, 0);
-    std::uint32_t aboveNoise = 0;
-    for (std::size_t i = 0; i < kPixelCount; ++i) {
-        aboveNoise |= static_cast<std::uint32_t>(pixels[i]._value > kNoiseLevel) << i;
-    }
-    if (aboveNoise == 0) {
-        return;
-    }
-    for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
-        for (std::uint32_t members = kGroupMasks[i] & aboveNoise; members != 0;
-             members &= members - 1) {
-            const int pixel = std::countr_zero(members);
-            addMember(pixel, pixels[static_cast<std::size_t>(pixel)]._value,
-                      pixels[static_cast<std::size_t>(_maxPixelIndex[i])]._value, _values[i],
-                      _maxPixelIndex[i]);
-        }
+    std::vector<std::int32_t> values(pixels.size());
+    std::ranges::transform(pixels, values.begin(), &Pixel::_value);
+    if (values.size() == kPixelCount) {
+        updateValues(std::span<const std::int32_t, kPixelCount>(values));
+    } else {
+        updateValuesRangeTested(values);
     }
 }
 
-void VirtualImage::updateValuesRangeTested(const std::vector<Pixel>& pixels) {
+bool VirtualImage::updateValues(std::span<const std::int32_t, kPixelCount> pixelValues) {
+    if (_values.size() < kVirtualPixelCount || _maxPixelIndex.size() < kVirtualPixelCount) {
+        updateValuesRangeTested(pixelValues);
+        return true;
+    }
+    std::array<std::int32_t, kPixelCount + 1> aboveNoise{};
+    std::int32_t any = 0;
+    for (std::size_t i = 0; i < kPixelCount; ++i) {
+        aboveNoise[i] = pixelValues[i] > kNoiseLevel ? pixelValues[i] : 0;
+        any |= aboveNoise[i];
+    }
+    if (any == 0) {
+        std::ranges::fill(_values, 0);
+        return false;
+    }
+    for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
+        const Members& members = kGroupMembers[i];
+        const std::array<std::int32_t, kMostMembers> values = {
+            aboveNoise[members[0]], aboveNoise[members[1]], aboveNoise[members[2]],
+            aboveNoise[members[3]]};
+        _values[i] = values[0] + values[1] + values[2] + values[3];
+        const std::int32_t most =
+            std::max(std::max(values[0], values[1]), std::max(values[2], values[3]));
+        // Member by member the strongest takes over from the one before; the first of the
+        // strongest stays. One below noise never takes over.
+        const std::int32_t remembered =
+            elementAt(pixelValues, static_cast<std::size_t>(_maxPixelIndex[i]));
+        if (most > std::max(remembered, kNoiseLevel)) {
+            const auto first = std::ranges::find(values, most) - values.begin();
+            _maxPixelIndex[i] = members[static_cast<std::size_t>(first)];
+        }
+    }
+    return true;
+}
+
+void VirtualImage::updateValuesRangeTested(std::span<const std::int32_t> pixelValues) {
     std::ranges::fill(_values, 0);
     for (std::size_t i = 0; i < _neighborPixelGroups.size(); ++i) {
         for (const char letter : _neighborPixelGroups[i]) {
             const std::size_t pixel = pixelOfLetter(letter);
-            const std::int32_t value = pixels.at(pixel)._value;
-            if (value > kNoiseLevel) {
-                const auto remembered = static_cast<std::size_t>(_maxPixelIndex.at(i));
-                addMember(static_cast<std::int32_t>(pixel), value, pixels.at(remembered)._value,
-                          _values.at(i), _maxPixelIndex.at(i));
+            const std::int32_t value = elementAt(pixelValues, pixel);
+            if (value <= kNoiseLevel) {
+                continue;
+            }
+            elementAt(_values, i) += value;
+            std::int32_t& strongest = elementAt(_maxPixelIndex, i);
+            if (value > elementAt(pixelValues, static_cast<std::size_t>(strongest))) {
+                strongest = static_cast<std::int32_t>(pixel);
             }
         }
     }

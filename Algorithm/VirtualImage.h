@@ -4,6 +4,7 @@
 
 #include <array>
 #include <cstdint>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -40,6 +41,9 @@ public:
     /// Throws std::out_of_range, leaving the update half done, when `pixels` lacks a member of a
     /// group or a vector is shorter than the list of groups.
     void updateValues(const std::vector<Pixel>& pixels);
+    /// The same from the pixels' `_value` alone. False when no pixel is above noise, so that all
+    /// sums are 0 and no member took over.
+    bool updateValues(std::span<const std::int32_t, kPixelCount> pixelValues);
 
     /// The member letters of each group. They never change after construction.
     [[nodiscard]] const std::vector<std::string>& neighborPixelGroups() const noexcept {
@@ -49,7 +53,7 @@ public:
     std::vector<std::int32_t> _values;  ///< sum of the members' `_value` above noise
 private:
     std::vector<std::string> _neighborPixelGroups;
-    void updateValuesRangeTested(const std::vector<Pixel>& pixels);
+    void updateValuesRangeTested(std::span<const std::int32_t> pixelValues);
 
 public:
     std::vector<std::int32_t> _maxPixelIndex;  ///< strongest member when last compared, 0 to 14

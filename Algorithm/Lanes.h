@@ -1,0 +1,58 @@
+#pragma once
+
+#include <array>
+#include <bit>
+#include <cstdint>
+
+namespace VexaTouch {
+
+/// Four numbers side by side. Every operation is the scalar one on each lane, rounded as the scalar
+/// one is, so results do not depend on the machine's instructions.
+using FloatLanes [[gnu::vector_size(16)]] = float;
+using IntegerLanes [[gnu::vector_size(16)]] = std::int32_t;
+
+// A call costs more than a step on four numbers, and vectors cross calls through memory.
+#define VEXA_LANES_INLINE [[gnu::always_inline]] inline
+
+VEXA_LANES_INLINE FloatLanes allLanes(float value) noexcept {
+    return FloatLanes{value, value, value, value};
+}
+
+VEXA_LANES_INLINE IntegerLanes allLanes(std::int32_t value) noexcept {
+    return IntegerLanes{value, value, value, value};
+}
+
+/// `yes` where the mask is all ones, `no` where it is zero.
+VEXA_LANES_INLINE IntegerLanes select(IntegerLanes mask, IntegerLanes yes,
+                                      IntegerLanes no) noexcept {
+    return (mask & yes) | (~mask & no);
+}
+
+VEXA_LANES_INLINE FloatLanes select(IntegerLanes mask, FloatLanes yes, FloatLanes no) noexcept {
+    return std::bit_cast<FloatLanes>(
+        select(mask, std::bit_cast<IntegerLanes>(yes), std::bit_cast<IntegerLanes>(no)));
+}
+
+/// See the scalar operations of the same names.
+VEXA_LANES_INLINE FloatLanes largerOrOld(FloatLanes candidate, FloatLanes old) noexcept {
+    return candidate > old ? candidate : old;
+}
+
+VEXA_LANES_INLINE FloatLanes smallerOrOld(FloatLanes candidate, FloatLanes old) noexcept {
+    return candidate < old ? candidate : old;
+}
+
+/// Rows become columns.
+VEXA_LANES_INLINE std::array<FloatLanes, 4> transposed(
+    const std::array<FloatLanes, 4>& rows) noexcept {
+    const FloatLanes low01 = __builtin_shufflevector(rows[0], rows[1], 0, 4, 1, 5);
+    const FloatLanes high01 = __builtin_shufflevector(rows[0], rows[1], 2, 6, 3, 7);
+    const FloatLanes low23 = __builtin_shufflevector(rows[2], rows[3], 0, 4, 1, 5);
+    const FloatLanes high23 = __builtin_shufflevector(rows[2], rows[3], 2, 6, 3, 7);
+    return {__builtin_shufflevector(low01, low23, 0, 1, 4, 5),
+            __builtin_shufflevector(low01, low23, 2, 3, 6, 7),
+            __builtin_shufflevector(high01, high23, 0, 1, 4, 5),
+            __builtin_shufflevector(high01, high23, 2, 3, 6, 7)};
+}
+
+}  // namespace VexaTouch
