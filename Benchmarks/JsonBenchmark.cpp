@@ -15,7 +15,7 @@ namespace {
 
 constexpr int kFrames = 20'000;
 constexpr std::size_t kReportBytes = 73;
-constexpr std::size_t kPieceBytes = 64 * 1024;
+constexpr std::size_t kPieceBytes = 65'536;
 
 std::string reportText(std::uint32_t frame) {
     constexpr std::string_view kDigits = "0123456789abcdef";

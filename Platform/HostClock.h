@@ -34,7 +34,9 @@ public:
 protected:
     HostClock() = default;
     HostClock(const HostClock&) = default;
+    HostClock(HostClock&&) = default;
     HostClock& operator=(const HostClock&) = default;
+    HostClock& operator=(HostClock&&) = default;
 };
 
 }  // namespace Vexa

@@ -39,7 +39,9 @@ public:
 protected:
     JsonHandler() = default;
     JsonHandler(const JsonHandler&) = default;
+    JsonHandler(JsonHandler&&) = default;
     JsonHandler& operator=(const JsonHandler&) = default;
+    JsonHandler& operator=(JsonHandler&&) = default;
 };
 
 }  // namespace Vexa

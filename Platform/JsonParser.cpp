@@ -296,7 +296,7 @@ bool JsonParser::write(std::string_view piece) {
 
 bool JsonParser::finish() {
     if (state_->hasEnded) return state_->errorMessage.empty();
-    if (!state_->read(false, std::string_view("", 0))) return false;
+    if (!state_->read(false, std::string_view(""))) return false;
     state_->hasEnded = true;
     return true;
 }

@@ -45,6 +45,20 @@ struct SinkState {
     bool isCalling = false;
 };
 
+/// Marks the sink as being called, for as long as this object lives.
+class CallMark {
+public:
+    explicit CallMark(SinkState& state) : state_(state) { state_.isCalling = true; }
+    ~CallMark() { state_.isCalling = false; }
+    CallMark(const CallMark&) = delete;
+    CallMark(CallMark&&) = delete;
+    CallMark& operator=(const CallMark&) = delete;
+    CallMark& operator=(CallMark&&) = delete;
+
+private:
+    SinkState& state_;
+};
+
 SinkState& sinkState() {
     // Never destroyed: detached threads may log until the process ends.
     static SinkState& state = *std::make_unique<SinkState>().release();
@@ -89,21 +103,16 @@ void Log::write(LogLevel level, std::string_view message) const noexcept {
         SinkState& state = sinkState();
         const std::lock_guard lock(state.mutex);
         if (state.isCalling) return;
-        state.isCalling = true;
+        const CallMark mark(state);
         // A copy keeps the sink alive when it replaces itself.
         const std::shared_ptr<const LogSink> sink = state.sink;
-        try {
-            if (sink) {
-                (*sink)(category_, level, message);
-            } else {
-                writeToStandardError(category_, level, message);
-            }
-        } catch (...) {
-            // The message is lost, the caller is not disturbed.
+        if (sink) {
+            (*sink)(category_, level, message);
+        } else {
+            writeToStandardError(category_, level, message);
         }
-        state.isCalling = false;
     } catch (...) {
-        // The lock or its memory could not be had.
+        return;  // the message is lost, the caller is not disturbed
     }
 }
 

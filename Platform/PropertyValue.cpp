@@ -97,28 +97,27 @@ PropertyNode* makeNode(T&& value) {
     return std::make_unique<NodeType>(std::forward<T>(value)).release();
 }
 
+template <class NodeType>
+void freeNode(PropertyNode* node) noexcept {
+    const std::unique_ptr<NodeType> owned(static_cast<NodeType*>(node));
+}
+
 void freeLeaf(PropertyNode* node) noexcept {
     switch (node->type) {
         case Type::Signed:
-            delete static_cast<SignedNode*>(node);
-            break;
+            return freeNode<SignedNode>(node);
         case Type::Unsigned:
-            delete static_cast<UnsignedNode*>(node);
-            break;
+            return freeNode<UnsignedNode>(node);
         case Type::Float:
-            delete static_cast<FloatNode*>(node);
-            break;
+            return freeNode<FloatNode>(node);
         case Type::Double:
-            delete static_cast<DoubleNode*>(node);
-            break;
+            return freeNode<DoubleNode>(node);
         case Type::String:
-            delete static_cast<StringNode*>(node);
-            break;
+            return freeNode<StringNode>(node);
         case Type::Bytes:
-            delete static_cast<BytesNode*>(node);
-            break;
+            return freeNode<BytesNode>(node);
         default:
-            break;
+            return;
     }
 }
 
@@ -146,13 +145,12 @@ void PropertyNode::release(PropertyNode* root) noexcept {
     while (waiting) {
         ContainerNode* container = std::exchange(waiting, waiting->nextToFree);
         if (container->type == Type::Array) {
-            auto* array = static_cast<ArrayNode*>(container);
+            const std::unique_ptr<ArrayNode> array(static_cast<ArrayNode*>(container));
             for (PropertyValue& element : array->content) drop(take(element));
-            delete array;
         } else {
-            auto* dictionary = static_cast<DictionaryNode*>(container);
+            const std::unique_ptr<DictionaryNode> dictionary(
+                static_cast<DictionaryNode*>(container));
             for (auto& [name, value] : dictionary->content) drop(take(value));
-            delete dictionary;
         }
     }
 }
@@ -164,17 +162,16 @@ using namespace Detail;
 PropertyValue::PropertyValue(const PropertyValue& other) noexcept
     : node_(PropertyNode::retain(other.node_)) {}
 
+// The old node goes last: it may be what holds the other value, or be the same one.
 PropertyValue& PropertyValue::operator=(const PropertyValue& other) noexcept {
-    // Retained first: the old node may be what holds the other value, or the same one.
-    PropertyNode* old = std::exchange(node_, PropertyNode::retain(other.node_));
-    PropertyNode::release(old);
+    PropertyValue next(other);
+    std::swap(node_, next.node_);
     return *this;
 }
 
 PropertyValue& PropertyValue::operator=(PropertyValue&& other) noexcept {
-    PropertyNode* next = std::exchange(other.node_, nullptr);
-    PropertyNode* old = std::exchange(node_, next);
-    PropertyNode::release(old);
+    PropertyValue next(std::move(other));
+    std::swap(node_, next.node_);
     return *this;
 }
 

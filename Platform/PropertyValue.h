@@ -56,6 +56,7 @@ public:
 
     // Each constructor may throw std::bad_alloc and nothing else. They convert implicitly, so that
     // a call such as setState("Algs.HoldTimeoutMilliseconds", 300) reads as it should.
+    // NOLINTBEGIN(google-explicit-constructor)
     PropertyValue(std::same_as<bool> auto value) : PropertyValue(fromBoolean(value)) {}
     PropertyValue(std::signed_integral auto value)
         : PropertyValue(fromSigned(static_cast<std::int64_t>(value))) {}
@@ -70,6 +71,7 @@ public:
     PropertyValue(Bytes bytes);
     PropertyValue(Array elements);
     PropertyValue(Dictionary members);
+    // NOLINTEND(google-explicit-constructor)
 
     [[nodiscard]] Type type() const noexcept;
     /// True unless this handle holds no value; null is a value.

@@ -59,7 +59,7 @@ TEST(HidEventTest, FieldsAtTheirDefaultsAreNotDescribed) {
 
 TEST(HidEventTest, EveryCopySeesWhatIsSet) {
     const HidEvent event = HidEvent::digitizer({.eventMask = 2, .y = 3});
-    const HidEvent copy = event;
+    const HidEvent copy = event;  // NOLINT(performance-unnecessary-copy-initialization)
     copy.setTimestamp(99);
     copy.setPhase(HidEventPhase::MayBegin);
     copy.setIntegerField(HidEventField::DigitizerFrameNumber, 4294967295);
@@ -102,7 +102,7 @@ TEST(HidEventTest, AnUnknownFieldIsIgnored) {
 
 TEST(HidEventTest, EventsAreEqualWhenTheyAreTheSameObject) {
     const HidEvent event = HidEvent::digitizer({});
-    const HidEvent copy = event;
+    const HidEvent copy = event;  // NOLINT(performance-unnecessary-copy-initialization)
     EXPECT_EQ(event, copy);
     EXPECT_FALSE(event == HidEvent::digitizer({}));
 }

@@ -248,9 +248,9 @@ TEST(JsonParserTest, RefusesWhatIsNoJson) {
                              "\"",
                              "\"\t\"",
                              "\"\x1F\"",
-                             "\"\\a\"",
-                             "\"\\u12\"",
-                             "\"\\u12G4\"",
+                             R"("\a")",
+                             R"("\u12")",
+                             R"("\u12G4")",
                              "{\"a\"}",
                              "{\"a\":}",
                              "{\"a\",1}",
@@ -321,6 +321,7 @@ TEST(JsonParserTest, IntegersKeepTheirValueAndSignType) {
     ASSERT_TRUE(parser.finish());
     using Kind = JsonNumber::Kind;
     std::vector<Kind> kinds;
+    kinds.reserve(log.numbers.size());
     for (const JsonNumber& number : log.numbers) kinds.push_back(number.kind);
     EXPECT_THAT(kinds, ElementsAre(Kind::Signed, Kind::Signed, Kind::Signed, Kind::Unsigned,
                                    Kind::Unsigned, Kind::Signed));

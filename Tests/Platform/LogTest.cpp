@@ -21,13 +21,13 @@ constexpr std::array kCategories = {LogCategory::HIDService, LogCategory::Pipeli
 /// Collects messages, and leaves the process's log as it was.
 class LogTest : public testing::Test {
 protected:
-    LogTest() {
+    void SetUp() override {
         Log::setSink([this](LogCategory category, LogLevel level, std::string_view message) {
             lines.push_back(std::string(logCategoryName(category)) + "/" +
                             std::string(logLevelName(level)) + "/" + std::string(message));
         });
     }
-    ~LogTest() override {
+    void TearDown() override {
         Log::setSink({});
         for (const LogCategory category : kCategories) Log::setLevel(category, LogLevel::Error);
     }
@@ -103,9 +103,9 @@ TEST_F(LogTest, WithoutASinkALineGoesToStandardError) {
 }
 
 TEST_F(LogTest, ThreadsLogOneAtATime) {
-    std::vector<std::thread> threads;
-    for (int thread = 0; thread < 4; ++thread) {
-        threads.emplace_back([] {
+    std::array<std::thread, 4> threads;
+    for (std::thread& thread : threads) {
+        thread = std::thread([] {
             const Log log(LogCategory::Pipeline);
             for (int round = 0; round < 250; ++round) {
                 log.write(LogLevel::Error, "m");

@@ -251,13 +251,13 @@ TEST(PropertyValueTest, FloatingPointNumbersCompareByTheirBitsAsDoubles) {
 }
 
 TEST(PropertyValueTest, ContainersCompareByTheirContent) {
-    const auto array = [](PropertyValue last) {
+    const auto array = [](const char* last) {
         return PropertyValue(PropertyValue::Array{1, last});
     };
     EXPECT_EQ(array("x"), array("x"));
     EXPECT_FALSE(array("x") == array("y"));
     EXPECT_FALSE(array("x") == PropertyValue(PropertyValue::Array{1}));
-    const auto dictionary = [](const char* key, PropertyValue value) {
+    const auto dictionary = [](const char* key, int value) {
         return PropertyValue(PropertyValue::Dictionary{{"a", 1}, {key, value}});
     };
     EXPECT_EQ(dictionary("b", 2), dictionary("b", 2));
@@ -268,7 +268,7 @@ TEST(PropertyValueTest, ContainersCompareByTheirContent) {
 
 TEST(PropertyValueTest, CopiesShareTheContent) {
     const PropertyValue value = "shared";
-    const PropertyValue copy = value;
+    const PropertyValue copy = value;  // NOLINT(performance-unnecessary-copy-initialization)
     EXPECT_EQ(copy.asString(), value.asString());
     PropertyValue assigned = 1;
     assigned = value;
@@ -356,6 +356,7 @@ TEST(PropertyValueTest, ThreadsShareOneValue) {
     constexpr int kThreads = 4;
     std::array<bool, kThreads> isGood{};
     std::vector<std::thread> threads;
+    threads.reserve(kThreads);
     for (bool& good : isGood) {
         threads.emplace_back([&good, mine = shared, &expected]() mutable {
             good = true;

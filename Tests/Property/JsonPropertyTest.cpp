@@ -133,8 +133,9 @@ rc::Gen<PropertyValue> scalar(Domain domain) {
         kinds.push_back(map(rc::gen::inRange<std::uint64_t>(0, 1ull << 32), [](std::uint64_t bits) {
             return PropertyValue(std::bit_cast<float>(static_cast<std::uint32_t>(bits)));
         }));
-        kinds.push_back(map(rc::gen::arbitrary<std::vector<std::uint8_t>>(),
-                            [](PropertyValue::Bytes bytes) { return PropertyValue(bytes); }));
+        kinds.push_back(
+            map(rc::gen::arbitrary<std::vector<std::uint8_t>>(),
+                [](PropertyValue::Bytes bytes) { return PropertyValue(std::move(bytes)); }));
         kinds.push_back(
             map(nearlyUtf8Text(), [](std::string text) { return PropertyValue(std::move(text)); }));
     }
