@@ -75,6 +75,16 @@ int usageError(Streams& streams, std::string_view command, std::string_view text
     return kExitUsage;
 }
 
+/// What is left over once the parser has taken all that it knows.
+std::string unexpected(const std::vector<std::string>& left) {
+    for (const std::string& each : left) {
+        if (each.size() > 1 && each.starts_with('-')) {
+            return "there is no option " + each.substr(0, each.find('='));
+        }
+    }
+    return "one argument too many: " + left.front();
+}
+
 // Results that did not reach their destination are a failure like any other.
 int flushed(Streams& streams, std::string_view command, int exitCode) {
     errno = 0;
@@ -98,6 +108,8 @@ int runGlobal(std::span<const std::string> arguments, Streams& streams) {
     } catch (const CLI::CallForHelp&) {
         streams.out << overviewText();
         return flushed(streams, "--help", kExitSuccess);
+    } catch (const CLI::ExtrasError&) {
+        return usageError(streams, "", unexpected(app.remaining()));
     } catch (const CLI::ParseError& error) {
         return usageError(streams, "", error.what());
     }
@@ -135,6 +147,8 @@ int CommandLine::run(std::span<const std::string> arguments, Streams& streams) {
         } catch (const CLI::CallForHelp&) {
             streams.out << helpText(*command);
             return flushed(streams, running, kExitSuccess);
+        } catch (const CLI::ExtrasError&) {
+            return usageError(streams, running, unexpected(parser->remaining()));
         } catch (const CLI::ParseError& error) {
             return usageError(streams, running, error.what());
         }

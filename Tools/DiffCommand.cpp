@@ -65,16 +65,33 @@ constexpr std::string_view kDescription =
     "Replays A and B side by side and compares, frame by frame, what each frame was, its events "
     "and every field of the algorithm's state after it. Printed are the first frame that differs "
     "with its fields that do, then for each field the number of frames on which it differs. "
-    "Frames are paired by their place in the recording.\n"
+    "Frames are paired by their place in the recording. A setting that --set-a or "
+    "--set-b gives is not compared itself.\n"
     "\n"
     "Fields are named as in the output of replay --trace: pixels[A]._progress, "
-    "virtual[ABE]._value, hand._isTouching, stats.numTaps, events.";
+    "virtual[ABE]._value, hand._isTouching, stats.numTaps, events; presence counts the frames that "
+    "only "
+    "one recording has.";
 
 constexpr std::string_view kEventsField = "events";
-constexpr std::string_view kMissingField = "(no such frame)";
+constexpr std::string_view kMissingField = "presence";
 
 /// Fields of the first frame that differs that are printed for a person; --json has them all.
 constexpr std::size_t kFieldsShown = 12;
+
+/// Where the algorithm keeps a setting. That what was set differs is no news, so these fields are
+/// not compared when the settings to compare are given.
+struct SettingField {
+    std::string_view key;
+    std::string_view field;
+};
+
+constexpr std::array<SettingField, 4> kSettingFields = {{
+    {"Algs.ActivationThreshold", "hand._activationThreshold"},
+    {"Algs.HoldTimeoutMilliseconds", "hand._hold_timeout_ms"},
+    {"Algs.EnableHoldSuppression", "hand._enableHoldSuppression"},
+    {"Algs.EnableTapSuppression", "hand._enableTapSuppression"},
+}};
 
 struct FieldDifference {
     std::string field;
@@ -127,7 +144,23 @@ private:
     StateSnapshot snapshot_;
 };
 
-Comparison compare(Side& a, Side& b, Streams& streams) {
+/// For each field whether it is compared.
+std::vector<bool> comparedFields(std::span<const Setting> settingsA,
+                                 std::span<const Setting> settingsB) {
+    std::vector<bool> compared(StateSnapshot::fieldCount(), true);
+    for (std::size_t field = 0; field < compared.size(); ++field) {
+        const auto found = std::ranges::find(kSettingFields, StateSnapshot::fieldName(field),
+                                             &SettingField::field);
+        if (found != kSettingFields.end()) {
+            const auto isGiven = [&](const Setting& setting) { return setting.key == found->key; };
+            compared[field] = std::ranges::none_of(settingsA, isGiven) &&
+                              std::ranges::none_of(settingsB, isGiven);
+        }
+    }
+    return compared;
+}
+
+Comparison compare(Side& a, Side& b, const std::vector<bool>& compared, Streams& streams) {
     Comparison result{
         .framesA = a.frameCount(), .framesB = b.frameCount(), .first = {}, .counts = {}};
     std::vector<std::uint64_t> counts(StateSnapshot::fieldCount(), 0);
@@ -140,6 +173,9 @@ Comparison compare(Side& a, Side& b, Streams& streams) {
         bool different = false;
         const bool isFirst = result.framesDifferent == 0;
         a.snapshot().forEachDifference(b.snapshot(), [&](std::size_t field) {
+            if (!compared[field]) {
+                return;
+            }
             different = true;
             ++counts[field];
             if (isFirst) {
@@ -284,7 +320,7 @@ int runDiff(const Arguments& arguments, Streams& streams) {
         arguments.given("B") ? readSide(arguments.value("B"), streams).frames : fileA.frames;
     Side a(std::move(fileA.frames), settingsA);
     Side b(std::move(framesB), settingsB);
-    const Comparison comparison = compare(a, b, streams);
+    const Comparison comparison = compare(a, b, comparedFields(settingsA, settingsB), streams);
     if (arguments.given("--json")) {
         printJson(comparison, streams);
     } else {

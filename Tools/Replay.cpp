@@ -18,8 +18,9 @@ std::string_view playedTypeName(PlayedType type) noexcept {
     return "state";
 }
 
-Replay::Replay(std::list<PipelineRecording::Frame> frames, std::span<const Setting> settings)
-    : recording_(std::move(frames)), upcoming_(recording_.frames().begin()) {
+Replay::Replay(std::list<PipelineRecording::Frame> frames, std::span<const Setting> settings,
+               Vexa::HostClock& clock)
+    : recording_(std::move(frames), clock), upcoming_(recording_.frames().begin()) {
     installProbes();
     recording_.playReset();
     for (const Setting& setting : settings) {

@@ -2,6 +2,7 @@
 
 #include "Algorithm/Algs.h"
 #include "Pipeline/PipelineRecording.h"
+#include "Platform/HostClock.h"
 #include "Shared/InputReport.h"
 #include "Tools/EventRecord.h"
 #include "Tools/SettingKeys.h"
@@ -50,7 +51,8 @@ public:
     static constexpr float kNoWaiting = std::numeric_limits<float>::infinity();
 
     explicit Replay(std::list<PipelineRecording::Frame> frames,
-                    std::span<const Setting> settings = {});
+                    std::span<const Setting> settings = {},
+                    Vexa::HostClock& clock = Vexa::HostClock::system());
     Replay(const Replay&) = delete;
     Replay& operator=(const Replay&) = delete;
 

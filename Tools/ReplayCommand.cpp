@@ -219,7 +219,7 @@ int runReplay(const Arguments& arguments, Streams& streams) {
     std::vector<EventRecord> actual;
 
     const auto playStart = std::chrono::steady_clock::now();
-    Replay replay(std::exchange(file.frames, {}), settings);
+    Replay replay(std::exchange(file.frames, {}), settings, streams.clock);
     {
         Progress progress(streams, "playing " + file.name, replay.frames().size());
         while (replay.canContinue()) {

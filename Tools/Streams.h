@@ -1,5 +1,7 @@
 #pragma once
 
+#include "Platform/HostClock.h"
+
 #include <istream>
 #include <ostream>
 
@@ -12,8 +14,9 @@ struct Streams {
     std::ostream& error;
     bool outIsTerminal = false;
     bool errorIsTerminal = false;
-    unsigned columns = 80;  ///< width of the terminal
-    unsigned rows = 24;     ///< height of the terminal
+    unsigned columns = 80;                               ///< width of the terminal
+    unsigned rows = 24;                                  ///< height of the terminal
+    Vexa::HostClock& clock = Vexa::HostClock::system();  ///< what playing in real time waits by
 };
 
 }  // namespace VexaTouch::Tools
