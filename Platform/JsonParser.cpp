@@ -21,22 +21,21 @@ bool isDigit(char character) {
     return character >= '0' && character <= '9';
 }
 
-/// Whether a number whose text is given, and which is not 0, is 1 or more in magnitude.
+/// Whether a number that no finite double, or none but 0, is near to is large. It is not 0.
 bool isLargeNumber(std::string_view text) {
     const std::size_t exponentAt = text.find_first_of("eE");
     const std::string_view mantissa = text.substr(0, exponentAt);
 
-    // The power of ten of the first digit that counts.
+    // The power of ten of the first digit that counts, or one more: nothing near 1 is asked about.
     const std::size_t point = std::min(mantissa.find('.'), mantissa.size());
     const std::size_t first = mantissa.find_first_of("123456789");
     auto power = static_cast<std::int64_t>(point) - static_cast<std::int64_t>(first);
-    if (first < point) --power;
 
     if (exponentAt != std::string_view::npos) {
         std::string_view digits = text.substr(exponentAt + 1);
         const bool isNegative = digits.front() == '-';
         if (isNegative || digits.front() == '+') digits.remove_prefix(1);
-        // At most 19 digits, see resumeAfterExponentOverflow.
+        // At most 19 digits that count, see resumeAfterExponentOverflow.
         std::int64_t exponent = 0;
         std::from_chars(digits.data(), digits.data() + digits.size(), exponent);
         power += isNegative ? -exponent : exponent;

@@ -263,7 +263,9 @@ TEST(PropertyValueTest, ContainersCompareByTheirContent) {
     EXPECT_EQ(dictionary("b", 2), dictionary("b", 2));
     EXPECT_FALSE(dictionary("b", 2) == dictionary("c", 2));
     EXPECT_FALSE(dictionary("b", 2) == dictionary("b", 3));
-    EXPECT_FALSE(dictionary("b", 2) == PropertyValue(PropertyValue::Dictionary{{"a", 1}}));
+    const PropertyValue shorter = PropertyValue::Dictionary{{"a", 1}};
+    EXPECT_FALSE(dictionary("b", 2) == shorter);
+    EXPECT_FALSE(shorter == dictionary("b", 2));
 }
 
 TEST(PropertyValueTest, CopiesShareTheContent) {
