@@ -1,13 +1,21 @@
 #include "Tools/Progress.h"
 
+#include "Shared/Util.h"
+
 #include <algorithm>
+#include <string_view>
+#include <utility>
 
 namespace VexaTouch::Tools {
 namespace {
 
-constexpr std::chrono::milliseconds kPatience{500};
-constexpr std::chrono::milliseconds kInterval{100};
+constexpr std::uint64_t kPatienceNs = 500'000'000;
+constexpr std::uint64_t kIntervalNs = 100'000'000;
 constexpr std::string_view kEraseLine = "\r\x1b[K";
+
+std::uint64_t nowNs(const Streams& streams) {
+    return Util::nanosecondsFromMachTime(streams.clock.now());
+}
 
 }  // namespace
 
@@ -17,7 +25,7 @@ Progress::Progress(Streams& streams, std::string label, std::uint64_t total, uns
       total_(total),
       shown_(streams.errorIsTerminal),
       lookEvery_(lookEvery),
-      next_(std::chrono::steady_clock::now() + kPatience) {}
+      nextNs_(nowNs(streams) + kPatienceNs) {}
 
 Progress::~Progress() {
     if (drawn_) {
@@ -27,11 +35,11 @@ Progress::~Progress() {
 
 void Progress::look(std::uint64_t done) {
     untilLook_ = lookEvery_;
-    const auto now = std::chrono::steady_clock::now();
-    if (now < next_) {
+    const std::uint64_t now = nowNs(streams_);
+    if (now < nextNs_) {
         return;
     }
-    next_ = now + kInterval;
+    nextNs_ = now + kIntervalNs;
     drawn_ = true;
     streams_.error << kEraseLine << label_;
     if (total_ > 0) {

@@ -2,7 +2,6 @@
 
 #include "Tools/Streams.h"
 
-#include <chrono>
 #include <cstdint>
 #include <string>
 
@@ -35,7 +34,7 @@ private:
     bool drawn_ = false;
     unsigned lookEvery_;
     unsigned untilLook_ = 1;
-    std::chrono::steady_clock::time_point next_;
+    std::uint64_t nextNs_;  // host time of the next look that may draw
 };
 
 }  // namespace VexaTouch::Tools
