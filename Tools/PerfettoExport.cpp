@@ -14,7 +14,7 @@ namespace {
 
 constexpr std::size_t kFlushSize = std::size_t{64} * 1024;
 constexpr std::uint64_t kProcess = 1;
-constexpr double kNsPerMicrosecond = 1000.0;
+constexpr std::uint64_t kNsPerMicrosecond = 1000;
 
 // Regions of a touch have no name of their own before it is clear whether it is a tap or a hold.
 std::string regionText(PixelRegion region) {
@@ -83,7 +83,12 @@ void PerfettoExport::beginEvent(std::string_view phase, std::string_view name) {
     json_.number(kProcess);
     if (phase != "M") {
         json_.key("ts");
-        json_.number(static_cast<double>(timeNs_) / kNsPerMicrosecond);
+        // A whole number as such: as a floating-point text it might get an exponent.
+        if (timeNs_ % kNsPerMicrosecond == 0) {
+            json_.number(timeNs_ / kNsPerMicrosecond);
+        } else {
+            json_.number(static_cast<double>(timeNs_) / kNsPerMicrosecond);
+        }
     }
     if (!name.empty()) {
         json_.key("name");
