@@ -1,12 +1,13 @@
 #include "Tools/LiveScreen.h"
 
+#include "Shared/Util.h"
+
 #include <poll.h>
 #include <termios.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
-#include <cerrno>
 #include <csignal>
 #include <iostream>
 #include <utility>
@@ -78,31 +79,34 @@ void LiveScreen::draw(const std::vector<std::string>& lines) {
     streams_.out << text << std::flush;
 }
 
-char LiveScreen::wait(std::chrono::steady_clock::time_point until) {
+char LiveScreen::wait(std::uint64_t untilNs) {
+    // In slices: how long a key or a signal may go unnoticed.
+    constexpr std::uint64_t kSliceUs = 10'000;
+    constexpr std::uint64_t kNsPerUs = 1000;
     while (interrupted() == 0) {
-        const auto left = until - std::chrono::steady_clock::now();
-        const bool due = left <= std::chrono::steady_clock::duration::zero();
-        // In slices, since a signal may arrive just before the waiting begins.
-        constexpr std::chrono::nanoseconds kSlice = std::chrono::milliseconds(50);
-        const auto slice =
-            due ? std::chrono::nanoseconds(0)
-                : std::min<std::chrono::nanoseconds>(
-                      std::chrono::duration_cast<std::chrono::nanoseconds>(left), kSlice);
-        const timespec time{.tv_sec = 0, .tv_nsec = static_cast<long>(slice.count())};
-        pollfd keyboard{
-            .fd = saved_->readsKeys ? STDIN_FILENO : -1, .events = POLLIN, .revents = 0};
-        if (ppoll(&keyboard, 1, &time, nullptr) > 0) {
-            char key = 0;
-            if (read(STDIN_FILENO, &key, 1) == 1) {
-                return key;
-            }
-            saved_->readsKeys = false;  // the terminal is gone
+        if (const char key = pressedKey(); key != 0) {
+            return key;
         }
-        if (due) {
+        const std::uint64_t now = nowNs();
+        if (now >= untilNs) {
             break;
         }
+        streams_.clock.sleepMicroseconds(std::min((untilNs - now) / kNsPerUs + 1, kSliceUs));
     }
     return 0;
+}
+
+std::uint64_t LiveScreen::nowNs() const {
+    return Util::nanosecondsFromMachTime(streams_.clock.now());
+}
+
+char LiveScreen::pressedKey() {
+    pollfd keyboard{.fd = saved_->readsKeys ? STDIN_FILENO : -1, .events = POLLIN, .revents = 0};
+    char key = 0;
+    if (poll(&keyboard, 1, 0) > 0 && read(STDIN_FILENO, &key, 1) != 1) {
+        saved_->readsKeys = false;  // the terminal is gone
+    }
+    return key;
 }
 
 int LiveScreen::interrupted() noexcept {

@@ -2,8 +2,8 @@
 
 #include "Tools/Streams.h"
 
-#include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -24,14 +24,19 @@ public:
     /// Draws the lines over those drawn before. No line may be wider than the terminal.
     void draw(const std::vector<std::string>& lines);
 
-    /// Waits until the time has come, a signal has arrived or a key was pressed; the key, or 0.
-    char wait(std::chrono::steady_clock::time_point until);
+    /// Waits until that time on the streams' clock, until a signal has arrived or a key was
+    /// pressed; gives the key, or 0. A key that is already there is given without waiting.
+    char wait(std::uint64_t untilNs);
+    /// The time on the streams' clock.
+    [[nodiscard]] std::uint64_t nowNs() const;
 
     /// The signal that arrived and asks for an end, or 0.
     [[nodiscard]] static int interrupted() noexcept;
 
 private:
     struct Saved;
+
+    char pressedKey();
 
     Streams& streams_;
     std::size_t drawnLines_ = 0;

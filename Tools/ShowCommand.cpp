@@ -12,7 +12,6 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
-#include <chrono>
 #include <csignal>
 #include <cstdint>
 #include <deque>
@@ -23,8 +22,6 @@
 
 namespace VexaTouch::Tools {
 namespace {
-
-using Clock = std::chrono::steady_clock;
 
 constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "FILE", .help = "The recording; - reads standard input"},
@@ -188,7 +185,8 @@ public:
           view_(depth, streams.columns, startNs_, replay.frames().size()),
           depth_(depth),
           speed_(speed),
-          screen_(streams) {
+          screen_(streams),
+          dueNs_(screen_.nowNs()) {
         for (const PipelineRecording::Frame& frame : replay.frames()) {
             if (frame.type == PipelineRecording::Frame::Type::InputReport) {
                 lastNs_ = std::max(lastNs_, frame.timestamp);
@@ -209,7 +207,8 @@ public:
     }
 
 private:
-    static constexpr std::chrono::milliseconds kDrawInterval{16};
+    static constexpr std::uint64_t kDrawIntervalNs = 16'000'000;
+    static constexpr std::uint64_t kPauseNs = 3'600'000'000'000;  // looked at again each hour
     static constexpr float kFastest = 64;
     static constexpr float kSlowest = 1.0F / 64;
 
@@ -223,18 +222,19 @@ private:
             const double ns =
                 static_cast<double>(frame.timestamp - *lastReportNs_) / static_cast<double>(speed_);
             constexpr double kLongest = 1e15;  // more than a week
-            due_ += std::chrono::nanoseconds(static_cast<std::int64_t>(std::min(ns, kLongest)));
+            dueNs_ += static_cast<std::uint64_t>(std::min(ns, kLongest));
         }
         lastReportNs_ = frame.timestamp;
-        if (const auto now = Clock::now(); now < due_ || now - drawn_ > kDrawInterval) {
+        if (const std::uint64_t now = screen_.nowNs();
+            now < dueNs_ || now - drawnNs_ > kDrawIntervalNs) {
             draw();
         }
         do {
-            handleKey(screen_.wait(paused_ ? Clock::now() + std::chrono::hours(1) : due_));
+            handleKey(screen_.wait(paused_ ? screen_.nowNs() + kPauseNs : dueNs_));
             ended_ = ended_ || LiveScreen::interrupted() != 0;
-        } while (!ended_ && !step_ && (paused_ || Clock::now() < due_));
+        } while (!ended_ && !step_ && (paused_ || screen_.nowNs() < dueNs_));
         if (std::exchange(step_, false)) {
-            due_ = Clock::now();
+            dueNs_ = screen_.nowNs();
         }
     }
 
@@ -242,7 +242,7 @@ private:
         switch (key) {
             case ' ':
                 paused_ = !paused_;
-                due_ = Clock::now();
+                dueNs_ = screen_.nowNs();
                 draw();
                 break;
             case '.':
@@ -297,7 +297,7 @@ private:
         // What does not fit above the cursor would scroll away instead of being drawn over.
         lines.resize(std::min<std::size_t>(lines.size(), std::max(streams_.rows, 2U) - 1));
         screen_.draw(lines);
-        drawn_ = Clock::now();
+        drawnNs_ = screen_.nowNs();
     }
 
     // "[=====>     ] 0.350 of 1.250 s"
@@ -330,8 +330,8 @@ private:
     ColorDepth depth_;
     float speed_;
     LiveScreen screen_;
-    Clock::time_point due_ = Clock::now();
-    Clock::time_point drawn_;
+    std::uint64_t dueNs_;  // when the next report's turn is, on the screen's clock
+    std::uint64_t drawnNs_ = 0;
     std::optional<std::uint64_t> lastReportNs_;
     std::uint64_t timeNs_ = 0;
     std::vector<std::string> lines_;
