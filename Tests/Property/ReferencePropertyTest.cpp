@@ -13,6 +13,7 @@
 #include <cstdlib>
 #include <iostream>
 #include <limits>
+#include <map>
 #include <optional>
 #include <random>
 #include <string>
@@ -161,6 +162,7 @@ TEST(ReferenceProperty, EveryFieldOfEveryFrameEqualsTheLiteralReading) {
 
     SeededRandom random(seed);
     std::vector<Step> session;
+    std::map<std::string, std::uint64_t, std::less<>> counts;
     for (std::uint64_t played = 0; played < frames; played += session.size()) {
         AnySession steps(random.next());
         // Many short sessions, since the first frames have cases of their own.
@@ -173,6 +175,17 @@ TEST(ReferenceProperty, EveryFieldOfEveryFrameEqualsTheLiteralReading) {
             if (twins.play(session.back())) {
                 FAIL() << report(std::move(session));
             }
+        }
+        forEachCounter(twins.algs.eventStats()._stats,
+                       [&counts](std::string_view name, std::uint64_t count) {
+                           counts.try_emplace(std::string(name)).first->second += count;
+                       });
+    }
+    if (frames >= 200'000) {
+        // The sessions reach whatever can be counted.
+        EXPECT_EQ(counts.size(), 24U);
+        for (const auto& [name, count] : counts) {
+            EXPECT_GT(count, 0U) << name;
         }
     }
 }
@@ -329,6 +342,11 @@ TEST(ReferenceProperty, AHandInAnyStateGoesTheWayOfTheLiteralReading) {
         switch (random.between(0, 6)) {
             case 0: {
                 const int index = random.between(0, 14);
+                if (random.oneIn(8)) {
+                    // A pixel of no region.
+                    const auto at = static_cast<std::size_t>(index);
+                    pixels[at]._index = literalPixels[at]._index = 15;
+                }
                 ASSERT_EQ(hand.changeActiveRegion(pixels, index),
                           literalHand.changeActiveRegion(literalPixels, index));
                 break;
