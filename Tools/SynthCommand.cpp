@@ -104,8 +104,9 @@ GestureScript parseScript(const std::string& text, const std::string& name) {
     }
 }
 
-void writeFrames(const GestureScript& script, std::optional<std::uint64_t> seed, OutputFile& file,
-                 Streams& streams) {
+/// Returns the number of frames written.
+std::uint64_t writeFrames(const GestureScript& script, std::optional<std::uint64_t> seed,
+                          OutputFile& file) {
     ContainerWriter writer([&file](std::string_view piece) { file.write(piece); });
     std::uint64_t frames = 0;
     SurfaceSynthesizer synthesizer(
@@ -116,11 +117,7 @@ void writeFrames(const GestureScript& script, std::optional<std::uint64_t> seed,
         seed);
     synthesizer.perform(script);
     writer.finish();
-    if (frames == 0) {
-        throw Failure("the script makes no frames: add a gesture, or idle 100ms");
-    }
-    file.commit();
-    streams.error << file.name() << ": " << frames << " frames\n";
+    return frames;
 }
 
 int runSynth(const Arguments& arguments, Streams& streams) {
@@ -132,10 +129,16 @@ int runSynth(const Arguments& arguments, Streams& streams) {
         file.commit();
         return kExitSuccess;
     }
-    const std::string name = arguments.given("SCRIPT") ? arguments.value("SCRIPT") : "--random";
-    const GestureScript script = parseScript(text, name == "-" ? "standard input" : name);
+    const std::string path = arguments.given("SCRIPT") ? arguments.value("SCRIPT") : "--random";
+    const std::string name = path == "-" ? "standard input" : path;
+    const GestureScript script = parseScript(text, name);
     OutputFile file(arguments.value("--output"), streams);
-    writeFrames(script, seed, file, streams);
+    const std::uint64_t frames = writeFrames(script, seed, file);
+    if (frames == 0) {
+        throw Failure(name + ": the script makes no frames (add a gesture, or idle 100ms)");
+    }
+    file.commit();
+    streams.error << file.name() << ": " << frames << " frames\n";
     return kExitSuccess;
 }
 
