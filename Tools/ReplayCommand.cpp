@@ -5,6 +5,7 @@
 #include "Tools/Failure.h"
 #include "Tools/LogOptions.h"
 #include "Tools/OutputFile.h"
+#include "Tools/PeakMemory.h"
 #include "Tools/Progress.h"
 #include "Tools/RecordingFile.h"
 #include "Tools/Replay.h"
@@ -112,10 +113,16 @@ double secondsSince(std::chrono::steady_clock::time_point start) {
     return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
 }
 
-std::string seconds(double value) {
-    std::array<char, 48> text{};
-    const int length = std::snprintf(text.data(), text.size(), "%.3f s", value);
-    return {text.data(), static_cast<std::size_t>(length)};
+/// The value with some decimals and its unit.
+std::string measured(double value, int decimals, std::string_view unit) {
+    std::array<char, 64> text{};
+    const int length = std::snprintf(text.data(), text.size(), "%.*f ", decimals, value);
+    return std::string(text.data(), static_cast<std::size_t>(length)) + std::string(unit);
+}
+
+std::string megabytes(std::uint64_t bytes) {
+    constexpr double bytesPerMb = 1e6;
+    return measured(static_cast<double>(bytes) / bytesPerMb, 1, "MB");
 }
 
 std::string counted(std::uint64_t count, std::string_view what) {
@@ -164,15 +171,18 @@ EventOutput::Form outputForm(const Arguments& arguments) {
 
 void printSummary(const RecordingFile& file, const ReplayCounts& counts, double readSeconds,
                   double playSeconds, Streams& streams) {
-    const double framesPerSecond =
-        playSeconds > 0 ? std::round(static_cast<double>(counts.frames) / playSeconds) : 0;
-    std::array<char, 48> rate{};
-    std::snprintf(rate.data(), rate.size(), "%.0f frames/s", framesPerSecond);
+    const double allSeconds = readSeconds + playSeconds;
+    const double rate = allSeconds > 0 ? static_cast<double>(counts.frames) / allSeconds : 0;
     streams.error << file.name << ": " << counted(counts.frames, "frame") << ", "
                   << counted(counts.events, "event") << ", "
-                  << counted(counts.invalidReports, "invalid report") << "; read in "
-                  << seconds(readSeconds) << ", played in " << seconds(playSeconds) << ", "
-                  << rate.data() << '\n';
+                  << counted(counts.invalidReports, "invalid report") << "; read "
+                  << megabytes(file.textBytes) << " in " << measured(readSeconds, 3, "s")
+                  << ", played in " << measured(playSeconds, 3, "s") << ", "
+                  << measured(rate, 0, "frames/s in all");
+    if (const auto peak = peakMemoryBytes()) {
+        streams.error << ", peak memory " << megabytes(*peak);
+    }
+    streams.error << '\n';
 }
 
 int reportDifference(const std::vector<EventRecord>& expected,

@@ -54,9 +54,10 @@ inline CommandResult runCommand(const std::vector<std::string>& arguments,
     return result;
 }
 
-/// The text with what differs from run to run, times and rates, as #.
+/// The text with what differs from run to run (times, rates, memory) as #.
 inline std::string withoutTimes(const std::string& text) {
-    return std::regex_replace(text, std::regex("[0-9]+\\.[0-9]{3} s|[0-9]+ frames/s"), "#");
+    return std::regex_replace(
+        text, std::regex("[0-9]+\\.[0-9]{3} s|[0-9]+ frames/s|memory [0-9.]+ MB"), "#");
 }
 
 /// A folder that is gone, with all in it, when the test ends.

@@ -44,7 +44,7 @@ constexpr const char* kMixedJson =
 )";
 
 std::string summary(const std::string& name, const std::string& counts) {
-    return name + ": " + counts + "; read in #, played in #, #\n";
+    return name + ": " + counts + "; read 0.0 MB in #, played in #, # in all, peak #\n";
 }
 
 constexpr const char* kMixedCounts = "125 frames, 8 events, 1 invalid report";
