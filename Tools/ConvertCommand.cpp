@@ -165,8 +165,9 @@ Frames readHidRecording(const std::string& path, Streams& streams) {
     std::uint64_t bytes = 0;
     try {
         for (std::string_view piece = file.next(); !piece.empty(); piece = file.next()) {
+            bytes += piece.size();
             reader.write(piece);
-            progress.update(bytes += piece.size());
+            progress.update(bytes);
         }
         Frames frames = reader.finish();
         if (reader.otherDevicesEvents() > 0) {
