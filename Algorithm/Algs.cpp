@@ -55,9 +55,11 @@ std::vector<Vexa::HidEvent> Algs::handleReset() {
 
 void Algs::processTouchFrame(const std::int16_t* samples, std::uint32_t frameNumber,
                              std::uint32_t timeMs, std::vector<Vexa::HidEvent>& events) {
-    ChannelUpdate update(_handStats._activationThreshold);
-    updateChannels(samples, update);
-    _handStats.updateHandState(_touchPixels, _virtualPixels, update.summarize(), timeMs);
+    ChannelSummary channels;
+    updatePixels(samples, channels);
+    _virtual_image.updateValues(std::span(channels.values).first<kPixelCount>());
+    updateVirtualPixels(channels);
+    _handStats.updateHandState(_touchPixels, _virtualPixels, channels, timeMs);
     decideEvent(frameNumber, events);
     _EventStats.update(_handStats);
     if (_log.isEnabled(Vexa::LogLevel::Debug)) {
@@ -65,34 +67,49 @@ void Algs::processTouchFrame(const std::int16_t* samples, std::uint32_t frameNum
     }
 }
 
-void Algs::updateChannels(const std::int16_t* samples, ChannelUpdate& update) {
-    update.updatePixels(std::span<Pixel, kPixelCount>(_touchPixels),
-                        std::span<const std::int16_t, kPixelCount>(samples, kPixelCount));
-    const std::int32_t neverActive = update.neverActive();
-    const bool anyAboveNoise =
-        _virtual_image.updateValues(std::span(update.values()).subspan<0, kPixelCount>());
-
+void Algs::updatePixels(const std::int16_t* samples, ChannelSummary& channels) noexcept {
     const float threshold = _handStats._activationThreshold;
-    const bool sameThreshold =
-        std::bit_cast<std::uint32_t>(threshold) == std::bit_cast<std::uint32_t>(quietThreshold_);
-    if (!anyAboveNoise && virtualPixelsQuiet_ && sameThreshold) {
-        update.keepVirtualPixels(quietNeverActive_);
-        return;
+    for (std::size_t i = 0; i < kPixelCount; ++i) {
+        Pixel& pixel = _touchPixels[i];
+        pixel.updatePixelState(samples[i], threshold);
+        channels.add(i, pixel);
     }
-    virtualPixelsQuiet_ = false;
+}
+
+void Algs::updateVirtualPixels(ChannelSummary& channels) {
     if (_virtualPixels.size() < kVirtualPixelCount ||
         _virtual_image._values.size() < kVirtualPixelCount ||
         _virtual_image._maxPixelIndex.size() < kVirtualPixelCount) {
         throwAtMissingVirtualPixel();
     }
-    update.updateVirtualPixels(
-        std::span(_virtualPixels).first<kVirtualPixelCount>(),
-        std::span(_virtual_image._values).first<kVirtualPixelCount>(),
-        std::span(_virtual_image._maxPixelIndex).first<kVirtualPixelCount>());
-    if (!anyAboveNoise && !update.anyActive()) {
-        virtualPixelsQuiet_ = true;
-        quietThreshold_ = threshold;
-        quietNeverActive_ = update.neverActive() - neverActive;
+    const float threshold = _handStats._activationThreshold;
+    const auto thresholdBits = std::bit_cast<std::uint32_t>(threshold);
+    const bool sameThreshold = quietThresholdBits_ == thresholdBits;
+    quietThresholdBits_ = thresholdBits;
+
+    if (channels.aboveNoise == 0 && virtualPixelsQuiet_ && sameThreshold) {
+        std::fill_n(channels.values.begin() + kPixelCount, kVirtualPixelCount, 0);
+        channels.largestValue = std::max(channels.largestValue, 0);
+    } else {
+        virtualPixelsQuiet_ = channels.aboveNoise == 0;
+        for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
+            VirtualPixel& pixel = _virtualPixels[i];
+            // The low 16 bits count: a strong group's sum deliberately wraps.
+            const auto sample = static_cast<std::int16_t>(_virtual_image._values[i]);
+            if (sample != 0 || pixel._value != 0 || pixel._isActive || !sameThreshold) {
+                pixel.updatePixelState(sample, threshold, _virtual_image._maxPixelIndex[i]);
+                virtualPixelsQuiet_ = virtualPixelsQuiet_ && !pixel._isActive;
+            } else {
+                pixel._index = _virtual_image._maxPixelIndex[i];
+            }
+            channels.add(kPixelCount + i, pixel);
+        }
+    }
+    if (channels.aboveNoise != 0 || channels.anyActive) {
+        channels.countNeverActive(_touchPixels, _virtualPixels);
+        neverActive_ = channels.neverActive;
+    } else {
+        channels.neverActive = neverActive_;
     }
 }
 
@@ -144,7 +161,7 @@ void Algs::Reset() noexcept {
         pixel.resetGlobalStats();
     }
     _handStats.Reset();
-    quietNeverActive_ = 0;
+    neverActive_ = 0;
 }
 
 Vexa::HidEvent Algs::createMayBeginEvent(PixelRegion region) {

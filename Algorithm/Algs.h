@@ -1,6 +1,6 @@
 #pragma once
 
-#include "Algorithm/ChannelUpdate.h"
+#include "Algorithm/ChannelSummary.h"
 #include "Algorithm/EventStats.h"
 #include "Algorithm/HandStats.h"
 #include "Algorithm/Pixel.h"
@@ -12,6 +12,7 @@
 #include "Shared/InputReport.h"
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -86,7 +87,8 @@ protected:
     std::uint16_t _lastDispatchedPhase = 0;
 
 private:
-    void updateChannels(const std::int16_t* samples, ChannelUpdate& update);
+    void updatePixels(const std::int16_t* samples, ChannelSummary& channels) noexcept;
+    void updateVirtualPixels(ChannelSummary& channels);
     /// Updates the virtual pixels up to the one that lacks an element, and throws.
     [[noreturn]] void throwAtMissingVirtualPixel();
     void decideEvent(std::uint32_t frameNumber, std::vector<Vexa::HidEvent>& events);
@@ -95,10 +97,11 @@ private:
     [[nodiscard]] std::string describeFrame(const std::string& channels, unsigned int timeMs) const;
 
     // A virtual pixel that was left inactive at value 0 cannot change by another sample of 0 at the
-    // same threshold. Most frames are of this kind.
+    // same threshold. After a frame of such pixels alone, all of them are quiet.
     bool virtualPixelsQuiet_ = false;
-    float quietThreshold_ = 0.0F;
-    std::int32_t quietNeverActive_ = 0;  // of the virtual pixels, see ChannelSummary
+    std::optional<std::uint32_t> quietThresholdBits_;
+    // ChannelSummary::neverActive, which only frames above noise and resets change.
+    std::int32_t neverActive_ = 0;
 };
 
 }  // namespace VexaTouch

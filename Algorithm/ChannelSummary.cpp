@@ -1,7 +1,5 @@
 #include "Algorithm/ChannelSummary.h"
 
-#include <algorithm>
-#include <limits>
 #include <stdexcept>
 
 namespace VexaTouch {
@@ -12,18 +10,29 @@ ChannelSummary ChannelSummary::of(const std::vector<Pixel>& pixels,
         throw std::out_of_range("there must be 15 pixels and 23 virtual pixels");
     }
     ChannelSummary summary;
-    summary.largestValue = std::numeric_limits<std::int32_t>::min();
-    auto value = summary.values.begin();
-    const auto look = [&](const Pixel& channel) {
-        *value++ = channel._value;
-        summary.largestValue = std::max(summary.largestValue, channel._value);
-        summary.aboveNoise += channel._isAboveNoise ? 1 : 0;
-        summary.neverActive += channel._wasAboveNoise && !channel._wasActive ? 1 : 0;
-        summary.anyActive |= channel._isActive;
-    };
-    std::ranges::for_each(pixels, look);
-    std::ranges::for_each(virtualPixels, look);
+    std::size_t channel = 0;
+    for (const Pixel& pixel : pixels) {
+        summary.add(channel++, pixel);
+    }
+    for (const VirtualPixel& pixel : virtualPixels) {
+        summary.add(channel++, pixel);
+    }
+    summary.countNeverActive(pixels, virtualPixels);
     return summary;
+}
+
+void ChannelSummary::countNeverActive(std::span<const Pixel> pixels,
+                                      std::span<const VirtualPixel> virtualPixels) noexcept {
+    const auto neverActiveOf = [](const Pixel& pixel) {
+        return static_cast<std::int32_t>(pixel._wasAboveNoise > pixel._wasActive);
+    };
+    neverActive = 0;
+    for (const Pixel& pixel : pixels) {
+        neverActive += neverActiveOf(pixel);
+    }
+    for (const VirtualPixel& pixel : virtualPixels) {
+        neverActive += neverActiveOf(pixel);
+    }
 }
 
 }  // namespace VexaTouch

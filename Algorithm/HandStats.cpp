@@ -78,7 +78,7 @@ void HandStats::updateHandState(const std::vector<Pixel>& pixels,
 void HandStats::updateHandState(const std::vector<Pixel>& pixels,
                                 const std::vector<VirtualPixel>& virtualPixels,
                                 const ChannelSummary& channels, unsigned int timeMs) {
-    if (channels.anyActive) {
+    if (channels.activeProgress > _peak_pixel_progress) {
         std::ranges::for_each(pixels, [this](const Pixel& pixel) { trackPeak(pixel); });
         std::ranges::for_each(virtualPixels, [this](const Pixel& pixel) { trackPeak(pixel); });
     }
@@ -107,7 +107,6 @@ void HandStats::updateHandState(const std::vector<Pixel>& pixels,
 
 void HandStats::trackPeak(const Pixel& channel) noexcept {
     if (channel._isActive && channel._progress > _peak_pixel_progress) {
-        // The peak starts at 0, so a progress that is negative or no number never sets it.
         _peak_pixel_progress = channel._progress;
         _peak_pixel_index = channel._index;
     }
@@ -226,11 +225,14 @@ void HandStats::updateTapRejection(const ChannelSummary& channels) noexcept {
 void HandStats::updateRegionMax(const std::vector<Pixel>& pixels) noexcept {
     _regionMax.fill(0.0F);
     for (const Pixel& pixel : pixels) {
+        if (pixel._value <= kNoiseLevel) {
+            continue;
+        }
         const PixelRegion region = pixel.getPixelRegion();
-        const float value = static_cast<float>(pixel._value) - static_cast<float>(kNoiseLevel);
-        if (region != kRegionNone && value > 0.0F) {
+        if (region != kRegionNone) {
             float& most = _regionMax[static_cast<std::size_t>(region)];
-            most = largerOrOld(value, most);
+            most = largerOrOld(static_cast<float>(pixel._value) - static_cast<float>(kNoiseLevel),
+                               most);
         }
     }
 }

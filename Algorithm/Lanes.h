@@ -22,17 +22,6 @@ VEXA_LANES_INLINE IntegerLanes allLanes(std::int32_t value) noexcept {
     return IntegerLanes{value, value, value, value};
 }
 
-/// `yes` where the mask is all ones, `no` where it is zero.
-VEXA_LANES_INLINE IntegerLanes select(IntegerLanes mask, IntegerLanes yes,
-                                      IntegerLanes no) noexcept {
-    return (mask & yes) | (~mask & no);
-}
-
-VEXA_LANES_INLINE FloatLanes select(IntegerLanes mask, FloatLanes yes, FloatLanes no) noexcept {
-    return std::bit_cast<FloatLanes>(
-        select(mask, std::bit_cast<IntegerLanes>(yes), std::bit_cast<IntegerLanes>(no)));
-}
-
 /// See the scalar operations of the same names.
 VEXA_LANES_INLINE FloatLanes largerOrOld(FloatLanes candidate, FloatLanes old) noexcept {
     return candidate > old ? candidate : old;

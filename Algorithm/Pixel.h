@@ -50,11 +50,14 @@ public:
 inline void Pixel::updatePixelState(int sample, float activationThreshold) noexcept {
     constexpr float kHysteresis = 0.6F;
     _value = static_cast<std::int32_t>(static_cast<float>(sample) * _normalizationFactor);
-    // The decision of the previous frame chooses between the two edges of the hysteresis.
-    const float threshold =
-        _isActive ? _peakProgress * kHysteresis : largerOrOld(_valleyProgress / kHysteresis, 1.0F);
     _progress = static_cast<float>(_value) / activationThreshold;
-    _isActive = _progress > threshold;
+    // The decision of the previous frame chooses the edge of the hysteresis. The edge to turn on
+    // is never below 1.0, so most pixels need not know theirs.
+    if (_isActive) {
+        _isActive = _progress > _peakProgress * kHysteresis;
+    } else if (_progress > 1.0F) {
+        _isActive = _progress > largerOrOld(_valleyProgress / kHysteresis, 1.0F);
+    }
     if (_isActive) {
         _peakProgress = largerOrOld(_progress, _peakProgress);
         _valleyProgress = _progress;

@@ -3,8 +3,8 @@
 #include "Algorithm/SortNetwork.h"
 
 #include <algorithm>
-#include <bit>
 #include <cstdint>
+#include <cstring>
 #include <limits>
 
 namespace VexaTouch {
@@ -47,13 +47,14 @@ void SVM::updateSVMScore(const ChannelSummary& channels, float activationThresho
         return;
     }
     // Places that no channel takes sort behind all channels.
-    alignas(FloatLanes) std::array<float, 48> values;
-    values.fill(-std::numeric_limits<float>::infinity());
+    SortNetwork::Run<12> sorted;
+    sorted.fill(allLanes(-std::numeric_limits<float>::infinity()));
+    std::array<float, kChannelCount> values;
     std::ranges::transform(channels.values, values.begin(),
                            [](std::int32_t value) { return static_cast<float>(value); });
-    auto lanes = std::bit_cast<SortNetwork::Run<12>>(values);
-    SortNetwork::sortDescending(lanes);
-    values = std::bit_cast<std::array<float, 48>>(lanes);
+    std::memcpy(sorted.data(), values.data(), sizeof values);
+    SortNetwork::sortDescending(sorted);
+    std::memcpy(values.data(), sorted.data(), sizeof values);
 
     Parameters terms;
     for (std::size_t k = 0; k < kChannelCount; ++k) {

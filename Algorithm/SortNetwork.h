@@ -26,28 +26,31 @@ VEXA_LANES_INLINE FloatLanes reversed(FloatLanes lanes) noexcept {
     return __builtin_shufflevector(lanes, lanes, 3, 2, 1, 0);
 }
 
-/// Sorts four numbers that first rise and then fall or the other way round.
-VEXA_LANES_INLINE FloatLanes mergedLanes(FloatLanes lanes) noexcept {
-    FloatLanes larger = lanes;
-    FloatLanes smaller = __builtin_shufflevector(lanes, lanes, 2, 3, 0, 1);
+/// Sorts the four numbers of each vector, which first rise and then fall or the other way round.
+VEXA_LANES_INLINE void mergeLanes(FloatLanes& a, FloatLanes& b) noexcept {
+    // Numbers two places apart, then neighbours, each against each.
+    FloatLanes larger = __builtin_shufflevector(a, b, 0, 1, 4, 5);
+    FloatLanes smaller = __builtin_shufflevector(a, b, 2, 3, 6, 7);
     order(larger, smaller);
-    lanes = __builtin_shufflevector(larger, smaller, 0, 1, 4, 5);
-    larger = __builtin_shufflevector(lanes, lanes, 0, 2, 0, 2);
-    smaller = __builtin_shufflevector(lanes, lanes, 1, 3, 1, 3);
-    order(larger, smaller);
-    return __builtin_shufflevector(larger, smaller, 0, 4, 1, 5);
+    FloatLanes even = __builtin_shufflevector(larger, smaller, 0, 2, 4, 6);
+    FloatLanes odd = __builtin_shufflevector(larger, smaller, 1, 3, 5, 7);
+    order(even, odd);
+    const FloatLanes low = __builtin_shufflevector(even, odd, 0, 4, 1, 5);
+    const FloatLanes high = __builtin_shufflevector(even, odd, 2, 6, 3, 7);
+    a = __builtin_shufflevector(low, high, 0, 1, 4, 5);
+    b = __builtin_shufflevector(low, high, 2, 3, 6, 7);
 }
 
-/// Sorts `n` (a power of two) vectors from `first` whose numbers first rise and then fall or the
-/// other way round.
+/// Sorts `n` (a power of two, at least 2) vectors from `first` whose numbers first rise and then
+/// fall or the other way round.
 template <std::size_t n>
 VEXA_LANES_INLINE void mergeBitonic(FloatLanes* first) noexcept {
-    if constexpr (n == 1) {
-        *first = mergedLanes(*first);
+    for (std::size_t i = 0; i < n / 2; ++i) {
+        order(first[i], first[i + n / 2]);
+    }
+    if constexpr (n == 2) {
+        mergeLanes(first[0], first[1]);
     } else {
-        for (std::size_t i = 0; i < n / 2; ++i) {
-            order(first[i], first[i + n / 2]);
-        }
         mergeBitonic<n / 2>(first);
         mergeBitonic<n / 2>(first + n / 2);
     }

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <stdexcept>
+#include <utility>
 
 namespace VexaTouch {
 
@@ -10,24 +11,6 @@ namespace {
 constexpr std::size_t pixelOfLetter(char letter) noexcept {
     return static_cast<std::size_t>(letter - 'A');
 }
-
-/// No group has more members.
-constexpr std::size_t kMostMembers = 4;
-
-/// The members of each group in letter order; a place that is left over names a pixel that is not
-/// there and always counts as 0.
-constexpr std::size_t kNoPixel = kPixelCount;
-using Members = std::array<std::uint8_t, kMostMembers>;
-constexpr std::array<Members, kVirtualPixelCount> kGroupMembers = [] {
-    std::array<Members, kVirtualPixelCount> groups{};
-    for (std::size_t i = 0; i < groups.size(); ++i) {
-        groups[i].fill(kNoPixel);
-        std::ranges::transform(kPixelGroups[i].letters, groups[i].begin(), [](char letter) {
-            return static_cast<std::uint8_t>(pixelOfLetter(letter));
-        });
-    }
-    return groups;
-}();
 
 [[noreturn]] void throwOutOfRange() {
     throw std::out_of_range("a pixel or pixel group is missing");
@@ -40,6 +23,30 @@ auto& elementAt(List& list, std::size_t index) {
         throwOutOfRange();
     }
     return list[index];
+}
+
+using PixelFloats = std::array<float, kPixelCount>;
+
+/// One group, whose members are known when this is compiled. Member by member the strongest takes
+/// over from the one before; the first of the strongest stays. One below noise never takes over.
+template <std::size_t group>
+void updateGroup(const PixelFloats& values, const PixelFloats& aboveNoise, std::int32_t& sum,
+                 std::int32_t& strongest) {
+    constexpr std::string_view letters = kPixelGroups[group].letters;
+    float total = aboveNoise[pixelOfLetter(letters[0])];
+    float most = total;
+    [&]<std::size_t... next>(std::index_sequence<next...>) {
+        ((total += aboveNoise[pixelOfLetter(letters[next + 1])],
+          most = largerOrOld(aboveNoise[pixelOfLetter(letters[next + 1])], most)),
+         ...);
+    }(std::make_index_sequence<letters.size() - 1>());
+    sum = static_cast<std::int32_t>(total);
+    const float remembered = elementAt(values, static_cast<std::size_t>(strongest));
+    if (most > largerOrOld(remembered, static_cast<float>(kNoiseLevel))) {
+        const auto* first = std::ranges::find_if(
+            letters, [&](char letter) { return aboveNoise[pixelOfLetter(letter)] == most; });
+        strongest = static_cast<std::int32_t>(pixelOfLetter(*first));
+    }
 }
 
 }  // namespace
@@ -58,46 +65,28 @@ VirtualImage::VirtualImage() : _values(kVirtualPixelCount, 0) {
 void VirtualImage::updateValues(const std::vector<Pixel>& pixels) {
     std::vector<std::int32_t> values(pixels.size());
     std::ranges::transform(pixels, values.begin(), &Pixel::_value);
-    if (values.size() == kPixelCount) {
-        updateValues(std::span<const std::int32_t, kPixelCount>(values));
-    } else {
-        updateValuesRangeTested(values);
-    }
+    updateValuesRangeTested(values);
 }
 
-bool VirtualImage::updateValues(std::span<const std::int32_t, kPixelCount> pixelValues) {
+void VirtualImage::updateValues(std::span<const std::int32_t, kPixelCount> pixelValues) {
     if (_values.size() < kVirtualPixelCount || _maxPixelIndex.size() < kVirtualPixelCount) {
         updateValuesRangeTested(pixelValues);
-        return true;
+        return;
     }
-    std::array<std::int32_t, kPixelCount + 1> aboveNoise{};
-    std::int32_t any = 0;
+    // As floats, of which a machine takes the larger in one step.
+    PixelFloats values{};
+    PixelFloats aboveNoise{};
     for (std::size_t i = 0; i < kPixelCount; ++i) {
-        aboveNoise[i] = pixelValues[i] > kNoiseLevel ? pixelValues[i] : 0;
-        any |= aboveNoise[i];
+        values[i] = static_cast<float>(pixelValues[i]);
+        aboveNoise[i] = pixelValues[i] > kNoiseLevel ? values[i] : 0.0F;
     }
-    if (any == 0) {
+    if (std::ranges::all_of(aboveNoise, [](float value) { return value == 0.0F; })) {
         std::ranges::fill(_values, 0);
-        return false;
+        return;
     }
-    for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
-        const Members& members = kGroupMembers[i];
-        const std::array<std::int32_t, kMostMembers> values = {
-            aboveNoise[members[0]], aboveNoise[members[1]], aboveNoise[members[2]],
-            aboveNoise[members[3]]};
-        _values[i] = values[0] + values[1] + values[2] + values[3];
-        const std::int32_t most =
-            std::max(std::max(values[0], values[1]), std::max(values[2], values[3]));
-        // Member by member the strongest takes over from the one before; the first of the
-        // strongest stays. One below noise never takes over.
-        const std::int32_t remembered =
-            elementAt(pixelValues, static_cast<std::size_t>(_maxPixelIndex[i]));
-        if (most > std::max(remembered, kNoiseLevel)) {
-            const auto first = std::ranges::find(values, most) - values.begin();
-            _maxPixelIndex[i] = members[static_cast<std::size_t>(first)];
-        }
-    }
-    return true;
+    [&]<std::size_t... group>(std::index_sequence<group...>) {
+        (updateGroup<group>(values, aboveNoise, _values[group], _maxPixelIndex[group]), ...);
+    }(std::make_index_sequence<kVirtualPixelCount>());
 }
 
 void VirtualImage::updateValuesRangeTested(std::span<const std::int32_t> pixelValues) {

@@ -41,9 +41,8 @@ public:
     /// Throws std::out_of_range, leaving the update half done, when `pixels` lacks a member of a
     /// group or a vector is shorter than the list of groups.
     void updateValues(const std::vector<Pixel>& pixels);
-    /// The same from the pixels' `_value` alone. False when no pixel is above noise, so that all
-    /// sums are 0 and no member took over.
-    bool updateValues(std::span<const std::int32_t, kPixelCount> pixelValues);
+    /// The same from the pixels' `_value` alone, each within +-2^22, where floats are exact sums.
+    void updateValues(std::span<const std::int32_t, kPixelCount> pixelValues);
 
     /// The member letters of each group. They never change after construction.
     [[nodiscard]] const std::vector<std::string>& neighborPixelGroups() const noexcept {

@@ -50,7 +50,7 @@ public:
         return images;
     }
 
-    /// A plausible mix of use: idle three frames in five, taps, holds, slides, a palm, noise.
+    /// A plausible mix of use: idle three frames in four, taps, holds, slides, a palm, noise.
     Images mixed(std::size_t frames) {
         Images images;
         std::size_t busy = 0;
@@ -58,8 +58,8 @@ public:
             const std::size_t before = images.size();
             gesture(images);
             busy += images.size() - before;
-            // Rest until three in five frames were idle.
-            while (images.size() < busy * 5 / 2 && images.size() < frames) {
+            // Rest until three in four frames were idle.
+            while (images.size() < busy * 4 && images.size() < frames) {
                 append(images, {}, kIdleNoise);
             }
         }
