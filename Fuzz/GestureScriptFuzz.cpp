@@ -58,8 +58,10 @@ void play(const GestureScript& script) {
             throw EnoughFrames();
         }
     });
+    require(script.frames <= kMaximumScriptFrames, "a script is bounded");
     try {
         synthesizer.perform(script);
+        require(frames == script.frames, "a script makes as many frames as it was checked for");
     } catch (const EnoughFrames&) {
     }
 }

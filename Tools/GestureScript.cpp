@@ -274,6 +274,8 @@ public:
         }
     }
 
+    [[nodiscard]] std::uint64_t frames() const { return frames_; }
+
 private:
     void checkFinger(const Line& line, const GestureCommand& command) {
         switch (command.kind) {
@@ -406,6 +408,7 @@ GestureScript GestureScript::parse(std::string_view text) {
         script.commands.push_back(readCommand(line, commandOf(line)));
         checker.check(line, script.commands.back());
     }
+    script.frames = checker.frames();
     return script;
 }
 

@@ -76,7 +76,7 @@ inline constexpr std::uint32_t kDefaultRate = 100;
 inline constexpr std::uint64_t kDefaultSeed = 1;
 
 // Limits, so that a slip of the finger asks for no endless recording.
-inline constexpr std::size_t kMaximumScriptBytes = 1024 * 1024;
+inline constexpr std::size_t kMaximumScriptBytes = 1'048'576;
 inline constexpr std::uint64_t kMaximumScriptFrames = 2'000'000;  ///< 5.5 hours at 100 Hz
 inline constexpr std::uint64_t kMaximumDurationMs = 3'600'000;    ///< of one command
 inline constexpr std::uint64_t kMaximumStrength = 20'000;
@@ -257,6 +257,7 @@ private:
 /// A script of gestures: one command a line, `#` begins a comment.
 struct GestureScript {
     std::vector<GestureCommand> commands;
+    std::uint64_t frames = 0;  ///< how many frames it makes
 
     /// Throws GestureScriptError; no script that it accepts is larger than the limits above.
     static GestureScript parse(std::string_view text);

@@ -30,7 +30,9 @@ constexpr std::int64_t kGainScale = 10'000;
 constexpr std::array<std::int64_t, kPixelCount> kDecimalGains = [] {
     std::array<std::int64_t, kPixelCount> gains{};
     for (std::size_t i = 0; i < kPixelCount; ++i) {
-        gains[i] = static_cast<std::int64_t>(static_cast<double>(kPixelGains[i]) * 10'000.0 + 0.5);
+        // One place more, to be rounded off.
+        gains[i] =
+            (static_cast<std::int64_t>(static_cast<double>(kPixelGains[i]) * 100'000.0) + 5) / 10;
     }
     return gains;
 }();
@@ -42,7 +44,8 @@ std::uint32_t eased(std::uint64_t elapsed, std::uint64_t whole) {
     }
     const std::uint64_t t = elapsed * kFullContact / whole;
     const std::uint64_t square = t * t >> 16U;
-    return static_cast<std::uint32_t>(square * (3U * kFullContact - 2U * t) >> 16U);
+    constexpr std::uint64_t kThree = std::uint64_t{3} << 16U;
+    return static_cast<std::uint32_t>(square * (kThree - 2U * t) >> 16U);
 }
 
 std::int32_t between(std::int32_t from, std::int32_t to, std::uint32_t part) {
@@ -238,7 +241,8 @@ void SurfaceSynthesizer::release() {
     if (!pressed_) {
         return;
     }
-    const SurfaceContact contact = *std::exchange(pressed_, std::nullopt);
+    const SurfaceContact contact = *pressed_;
+    pressed_.reset();
     const std::uint64_t whole = liftoffMs_ * kNsPerMs;
     const std::uint64_t count = imagesIn(liftoffMs_, rate_);
     for (std::uint64_t k = 0; k < count; ++k) {

@@ -104,20 +104,12 @@ GestureScript parseScript(const std::string& text, const std::string& name) {
     }
 }
 
-/// Returns the number of frames written.
-std::uint64_t writeFrames(const GestureScript& script, std::optional<std::uint64_t> seed,
-                          OutputFile& file) {
+void writeFrames(const GestureScript& script, std::optional<std::uint64_t> seed, OutputFile& file) {
     ContainerWriter writer([&file](std::string_view piece) { file.write(piece); });
-    std::uint64_t frames = 0;
     SurfaceSynthesizer synthesizer(
-        [&](const PipelineRecording::Frame& frame) {
-            writer.write(frame);
-            ++frames;
-        },
-        seed);
+        [&writer](const PipelineRecording::Frame& frame) { writer.write(frame); }, seed);
     synthesizer.perform(script);
     writer.finish();
-    return frames;
 }
 
 int runSynth(const Arguments& arguments, Streams& streams) {
@@ -132,13 +124,13 @@ int runSynth(const Arguments& arguments, Streams& streams) {
     const std::string path = arguments.given("SCRIPT") ? arguments.value("SCRIPT") : "--random";
     const std::string name = path == "-" ? "standard input" : path;
     const GestureScript script = parseScript(text, name);
-    OutputFile file(arguments.value("--output"), streams);
-    const std::uint64_t frames = writeFrames(script, seed, file);
-    if (frames == 0) {
+    if (script.frames == 0) {
         throw Failure(name + ": the script makes no frames (add a gesture, or idle 100ms)");
     }
+    OutputFile file(arguments.value("--output"), streams);
+    writeFrames(script, seed, file);
     file.commit();
-    streams.error << file.name() << ": " << frames << " frames\n";
+    streams.error << file.name() << ": " << script.frames << " frames\n";
     return kExitSuccess;
 }
 

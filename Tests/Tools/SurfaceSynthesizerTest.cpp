@@ -198,6 +198,19 @@ TEST(SurfaceSynthesizerTest, ImagesComeAtTheRateWithALittleJitter) {
     EXPECT_TRUE(jitters);
 }
 
+TEST(SurfaceSynthesizerTest, AScriptMakesAsManyFramesAsItWasCheckedFor) {
+    for (const char* text :
+         {"", "tap K", "rate 3\nidle 1s\ntap K 1ms",
+          "rate 7\ngap 99ms\nslide K L 333ms\npalm\nhover K",
+          "approach 0ms\nliftoff 1ms\npress K\nmove L 5ms\nreset\nrelease", "rate 1\ntap K 1ms",
+          "set K 1\ninvalid\nfirmware 2\nskip 4\nclock 5\nframe 6\nseed 7"}) {
+        const GestureScript script = GestureScript::parse(text);
+        EXPECT_EQ(synthesize(script).size(), script.frames) << text;
+    }
+    const GestureScript script = GestureScript::parse(randomScript(3, 100'000));
+    EXPECT_EQ(synthesize(script).size(), script.frames);
+}
+
 TEST(SurfaceSynthesizerTest, TimestampsNeverGoBackWhateverComesBetween) {
     std::string script = "rate 1000\n";
     for (int i = 0; i < 300; ++i) {
