@@ -11,7 +11,6 @@
 #include <benchmark/benchmark.h>
 
 #include <malloc.h>
-#include <stdlib.h>
 #include <unistd.h>
 
 #include <cstdint>
@@ -121,7 +120,7 @@ void ReplayEndToEnd(benchmark::State& state) {
             break;
         }
     }
-    const auto frames = static_cast<double>(state.iterations() * kFrames);
+    const auto frames = static_cast<double>(state.iterations()) * static_cast<double>(kFrames);
     const auto text = static_cast<double>(recording.textBytes());
     const double peak = peakMemory(recording.statusPath());
     state.counters["frames/s"] = benchmark::Counter(frames, benchmark::Counter::kIsRate);
@@ -151,8 +150,9 @@ void ReplayFromMemory(benchmark::State& state) {
         state.ResumeTiming();
     }
     benchmark::DoNotOptimize(events);
-    state.counters["frames/s"] = benchmark::Counter(
-        static_cast<double>(state.iterations() * file.frames.size()), benchmark::Counter::kIsRate);
+    state.counters["frames/s"] =
+        benchmark::Counter(static_cast<double>(state.iterations()) * static_cast<double>(kFrames),
+                           benchmark::Counter::kIsRate);
 }
 BENCHMARK(ReplayFromMemory)->Unit(benchmark::kMillisecond);
 

@@ -190,13 +190,25 @@ void writeFile(const std::filesystem::path& path, std::string_view text) {
     }
 }
 
+/// A line of bash that offers what the command prints, names with spaces kept whole.
+std::string offer(const std::string& command) {
+    return "mapfile -t COMPREPLY < <(" + command + " -- \"$current\")";
+}
+
+std::string offerWords(const std::string& words) {
+    return offer("compgen -W '" + words + "'");
+}
+
 /// What bash offers for a value.
-std::string completionOf(ValueKind kind, std::string_view choices) {
-    switch (kind) {
+std::string completionOf(const OptionEntry& option) {
+    switch (option.kind) {
         case ValueKind::File:
-            return "COMPREPLY=($(compgen -f -- \"$current\"))";
-        case ValueKind::Choice:
-            return "COMPREPLY=($(compgen -W '" + std::string(choices) + "' -- \"$current\"))";
+            return offer("compgen -f");
+        case ValueKind::Choice: {
+            const bool goesOn = option.choices.ends_with('=') || option.choices.ends_with('.');
+            return (goesOn ? "compopt -o nospace 2>/dev/null; " : "") +
+                   offerWords(std::string(option.choices));
+        }
         case ValueKind::Text:
             break;
     }
@@ -341,24 +353,28 @@ void writeManPages(const std::string& folder) {
 }
 
 std::string completionScript() {
+    std::string commands = "--help --version";
+    for (const Command* command : commandTable()) {
+        commands += ' ';
+        commands += command->name;
+    }
     std::string script =
         "# bash completion of vexatouch, made by `vexatouch --generate-completion`\n"
         "_vexatouch() {\n"
-        "    local current=${COMP_WORDS[COMP_CWORD]} previous=${COMP_WORDS[COMP_CWORD-1]}\n"
+        "    local current=${COMP_WORDS[COMP_CWORD]} previous=${COMP_WORDS[COMP_CWORD - 1]}\n"
         "    if ((COMP_CWORD == 1)); then\n"
-        "        COMPREPLY=($(compgen -W '--help --version";
-    for (const Command* command : commandTable()) {
-        script += ' ';
-        script += command->name;
-    }
-    script +=
-        "' -- \"$current\"))\n"
+        "        " +
+        offerWords(commands) +
+        "\n"
         "        return\n"
         "    fi\n"
         "    case ${COMP_WORDS[1]} in\n";
     for (const Command* command : commandTable()) {
         script += "        " + std::string(command->name) + ")\n            case $previous in\n";
-        for (const OptionEntry& option : command->options) {
+        std::string options;
+        for (const OptionEntry& option : withHelp(*command)) {
+            options += options.empty() ? "" : " ";
+            options += option.name;
             if (option.valueName.empty()) {
                 continue;
             }
@@ -366,18 +382,14 @@ std::string completionScript() {
             if (!option.shortName.empty()) {
                 script += std::string(option.shortName) + " | ";
             }
-            script += std::string(option.name) + ") " + completionOf(option.kind, option.choices) +
-                      "; return ;;\n";
+            script += std::string(option.name) + ") " + completionOf(option) + "; return ;;\n";
         }
         script +=
-            "            esac\n            if [[ $current == -* ]]; then\n"
-            "                COMPREPLY=($(compgen -W '";
-        for (const OptionEntry& option : withHelp(*command)) {
-            script += std::string(option.name) + ' ';
-        }
-        script.pop_back();
-        script +=
-            "' -- \"$current\"))\n"
+            "            esac\n"
+            "            if [[ $current == -* ]]; then\n"
+            "                " +
+            offerWords(options) +
+            "\n"
             "                return\n"
             "            fi\n"
             "            ;;\n";
@@ -385,7 +397,9 @@ std::string completionScript() {
     script +=
         "        *) return ;;\n"
         "    esac\n"
-        "    COMPREPLY=($(compgen -f -- \"$current\"))\n"
+        "    " +
+        offer("compgen -f") +
+        "\n"
         "}\n"
         "complete -o filenames -F _vexatouch vexatouch\n";
     return script;

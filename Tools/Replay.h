@@ -53,6 +53,7 @@ public:
     explicit Replay(std::list<PipelineRecording::Frame> frames,
                     std::span<const Setting> settings = {},
                     Vexa::HostClock& clock = Vexa::HostClock::system());
+    ~Replay() = default;
     Replay(const Replay&) = delete;
     Replay& operator=(const Replay&) = delete;
 

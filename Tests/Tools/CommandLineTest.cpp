@@ -226,7 +226,7 @@ std::vector<std::string> offered(const TemporaryFolder& folder,
 
 TEST(CommandLineTest, CompletionOffersCommandsOptionsChoicesAndFiles) {
     const TemporaryFolder folder;
-    const std::string file = folder.file("session.json", "");
+    static_cast<void>(folder.file("session.json", ""));
     std::vector<std::string> commands = {"--help", "--version"};
     for (const Command* command : commandTable()) {
         commands.emplace_back(command->name);
@@ -247,6 +247,11 @@ TEST(CommandLineTest, CompletionOffersCommandsOptionsChoicesAndFiles) {
                 ElementsAreArray({"session.json"}));
     EXPECT_THAT(offered(folder, {"vexatouch", "replay", "ses"}),
                 ElementsAreArray({"session.json"}));
+    static_cast<void>(folder.file("two words.json", ""));
+    EXPECT_THAT(offered(folder, {"vexatouch", "replay", "two"}),
+                ElementsAreArray({"two words.json"}));
+    EXPECT_THAT(offered(folder, {"vexatouch", "replay", "--set", "Hold"}),
+                ElementsAreArray({"HoldTimeoutMilliseconds="}));
 }
 
 #ifdef VEXATOUCH_PROGRAM

@@ -173,7 +173,7 @@ TEST_F(ReplayCommandTest, EventsThatDifferStandSideBySide) {
     std::vector<std::string> lines = linesOf(kMixedJson);
     lines.erase(lines.begin() + 1);  // the tap was not expected
     lines[2] = std::regex_replace(lines[2], std::regex("10780"), "10790");
-    lines.push_back(
+    lines.emplace_back(
         R"({"index":120,"time_ns":6180000000,"device_ms":10180,"frame":110,"kind":"tap","region":1,"phase":0,"mask":131072})");
     std::string text;
     for (const std::string& line : lines) {

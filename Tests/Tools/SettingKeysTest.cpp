@@ -14,7 +14,6 @@ namespace VexaTouch::Tools {
 namespace {
 
 using ::testing::ElementsAre;
-using ::testing::HasSubstr;
 using ::testing::StartsWith;
 using Vexa::PropertyValue;
 
