@@ -1,14 +1,21 @@
+#include "Algorithm/StateFields.h"
 #include "Platform/Json.h"
 #include "Platform/Log.h"
 #include "Tests/Support/FakeHostClock.h"
 #include "Tests/Tools/CommandRun.h"
 #include "Tests/Tools/RecordedSession.h"
+#include "Tools/Replay.h"
 #include "Tools/SettingKeys.h"
 
 #include <gmock/gmock.h>
 
+#include <array>
+#include <bit>
+#include <cmath>
+#include <cstdint>
 #include <regex>
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace VexaTouch::Testing {
@@ -427,6 +434,73 @@ TEST_F(ReplayCommandTest, TracedFloatsReadBackToTheSameBitsAndNonFiniteOnesAreNa
     const std::string plain = replay({session, "--trace", "-"}).out;
     EXPECT_THAT(plain, HasSubstr(R"("_normalizationFactor":1.9219,)"));
     EXPECT_THAT(plain, HasSubstr(R"("_activationThreshold":200.0,)"));
+}
+
+/// Holds a traced member to the field of the state that it is to be.
+struct ExpectTraced {
+    const PropertyValue& object;
+
+    void operator()(std::string_view name, bool field) const {
+        EXPECT_EQ(object.member(name), PropertyValue(field)) << name;
+    }
+    void operator()(std::string_view name, std::int32_t field) const {
+        EXPECT_EQ(object.member(name), PropertyValue(field)) << name;
+    }
+    void operator()(std::string_view name, std::uint32_t field) const {
+        EXPECT_EQ(object.member(name), PropertyValue(field)) << name;
+    }
+    void operator()(std::string_view name, float field) const {
+        const PropertyValue value =
+            name == "_svm._score" ? object.member("_svm").member("_score") : object.member(name);
+        expectFloat(value, field, name);
+    }
+    void operator()(std::string_view name, const std::array<float, kRegionCount>& field) const {
+        const PropertyValue array = object.member(name);
+        ASSERT_EQ(array.asArray()->size(), field.size());
+        for (std::size_t i = 0; i < field.size(); ++i) {
+            expectFloat(element(array, i), field[i], name);
+        }
+    }
+
+    static void expectFloat(const PropertyValue& value, float field, std::string_view name) {
+        if (std::isfinite(field)) {
+            EXPECT_EQ(std::bit_cast<std::uint32_t>(value.toFloat()),
+                      std::bit_cast<std::uint32_t>(field))
+                << name;
+        } else {
+            const std::string text =
+                std::isnan(field) ? "nan" : std::string(field > 0 ? "inf" : "-inf");
+            EXPECT_EQ(value, PropertyValue(text)) << name;
+        }
+    }
+};
+
+TEST_F(ReplayCommandTest, EveryTracedFieldReadsBackToTheStateOfItsFrame) {
+    for (const std::string threshold : {"200.0", "0", "-3.7", "1e-40", "1e39"}) {
+        const std::string setting = "ActivationThreshold=" + threshold;
+        const std::vector<PropertyValue> lines =
+            traceOf(replay({session, "--trace", "-", "--set", setting}).out);
+        const std::vector<Tools::Setting> settings = {Tools::parseSetting(setting)};
+        Tools::Replay played(mixedSession().frames(), settings);
+        for (const PropertyValue& line : lines) {
+            ASSERT_TRUE(played.canContinue());
+            played.next();
+            const Algs& algs = played.algs();
+            for (std::size_t i = 0; i < kPixelCount; ++i) {
+                forEachPixelField(algs.touchPixels()[i],
+                                  ExpectTraced{element(line.member("pixels"), i)});
+            }
+            for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
+                forEachPixelField(algs.virtualPixels()[i],
+                                  ExpectTraced{element(line.member("virtual"), i)});
+            }
+            forEachHandStatsField(algs.handStats(), ExpectTraced{line.member("hand")});
+            EXPECT_EQ(line.member("stats"), algs.eventStats().statsDictionary());
+            EXPECT_EQ(line.member("lastDispatchedPhase"),
+                      PropertyValue(algs.lastDispatchedPhase()));
+        }
+        EXPECT_FALSE(played.canContinue());
+    }
 }
 
 TEST_F(ReplayCommandTest, ATraceThatCannotBeWrittenIsAFailure) {
