@@ -17,6 +17,8 @@ using Frame = PipelineRecording::Frame;
 /// How a member was given; of duplicates the last one.
 enum class Given : std::uint8_t { No, Wrong, Right };
 
+enum class TypeName : std::uint8_t { Unknown, InputReport, State };
+
 /// A frame object as far as it is read. Which faults it has is decided at its end, since its
 /// members come in any order.
 struct FrameMembers {
@@ -25,9 +27,13 @@ struct FrameMembers {
     Given key = Given::No;
     Given value = Given::No;
     Given report = Given::No;  // "Report", or "ReportData" in version 0
+    TypeName typeName = TypeName::Unknown;
     bool invalidHexString = false;
-    std::string typeName;
     Frame frame;
+
+    /// Ready for the next object. Whether a member was given decides what of the frame counts, so
+    /// the frame itself may stay as it is.
+    void restart() noexcept { type = timestamp = key = value = report = Given::No; }
 };
 
 /// What became of the array of one of the two versions.
@@ -90,13 +96,13 @@ const char* frameFault(const FrameMembers& members) noexcept {
     if (members.timestamp != Given::Right) {
         return Container::InvalidFrameTimestamp;
     }
-    if (members.typeName == Container::TypeState) {
+    if (members.typeName == TypeName::State) {
         if (members.key != Given::Right) {
             return Container::InvalidStateKey;
         }
         return members.value == Given::Right ? nullptr : Container::InvalidStateValue;
     }
-    if (members.typeName == Container::TypeInputReport) {
+    if (members.typeName == TypeName::InputReport) {
         if (members.report != Given::Right) {
             return Container::InvalidReport;
         }
@@ -128,7 +134,7 @@ public:
                 place_ = Place::Container;
                 break;
             case Place::Array:
-                members_ = {};
+                members_.restart();
                 place_ = Place::Frame;
                 break;
             default:
@@ -161,7 +167,7 @@ public:
             return;
         }
         if (place_ == Place::Array) {
-            members_ = {};  // an element that is no object: it ends with the array
+            members_.restart();  // an element that is no object: it ends with the array
         } else {
             refuseValue();
         }
@@ -322,7 +328,7 @@ private:
                 refuseContainerMember();
                 break;
             case Place::Array:
-                members_ = {};
+                members_.restart();
                 endElement();
                 break;
             case Place::Frame:
@@ -373,7 +379,9 @@ private:
         switch (frameMember_) {
             case FrameMember::Type:
                 members_.type = Given::Right;
-                members_.typeName = text;
+                members_.typeName = text == Container::TypeInputReport ? TypeName::InputReport
+                                    : text == Container::TypeState     ? TypeName::State
+                                                                       : TypeName::Unknown;
                 break;
             case FrameMember::Key:
                 members_.key = Given::Right;
@@ -390,7 +398,7 @@ private:
 
     void takeReport(std::string_view text) {
         try {
-            members_.frame.report = Util::bytesFromHexString(text);
+            Util::readHexString(text, members_.frame.report);
             members_.invalidHexString = false;
         } catch (const std::invalid_argument&) {
             members_.invalidHexString = true;
@@ -424,7 +432,7 @@ private:
                 return;
             }
             members_.type = Given::Right;
-            members_.typeName = Container::TypeInputReport;
+            members_.typeName = TypeName::InputReport;
         }
         if (const char* fault = frameFault(members_)) {
             ++array.refused;
@@ -434,16 +442,17 @@ private:
             }
             return;
         }
-        Frame& frame = members_.frame;
-        if (members_.typeName == Container::TypeState) {
+        Frame& from = members_.frame;
+        Frame& frame = array.frames.emplace_back();
+        frame.timestamp = from.timestamp;
+        if (members_.typeName == TypeName::State) {
             frame.type = Frame::Type::State;
-            frame.report = {};
+            frame.key = std::move(from.key);
+            frame.value = std::move(from.value);
         } else {
             frame.type = Frame::Type::InputReport;
-            frame.key.clear();
-            frame.value = {};
+            frame.report = std::move(from.report);
         }
-        array.frames.push_back(std::move(frame));
     }
 
     static std::uint64_t readUnsigned(const Vexa::JsonNumber& number) {

@@ -58,20 +58,28 @@ public:
     explicit HexNumberReader(std::string_view text) noexcept
         : next_(text.data()), end_(text.data() + text.size()) {}
 
-    /// Two digits closed by a space are by far the most common number.
-    bool readPlainByte(std::uint8_t& byte) noexcept {
-        if (end_ - next_ < 3 || next_[2] != ' ') {
+    /// Two digits closed by a space are by far the most common number. Reads eight of them, or
+    /// nothing when any is of another form.
+    bool readPlainBytes(std::uint8_t* bytes) noexcept {
+        constexpr std::ptrdiff_t kLength = kPlainBytes * sizeof(HexText);
+        if (end_ - next_ < kLength) {
             return false;
         }
-        const std::uint8_t high = hexDigit(next_[0]);
-        const std::uint8_t low = hexDigit(next_[1]);
-        if ((high | low) > 0x0F) {
+        unsigned wrong = 0;
+        for (std::size_t i = 0; i < kPlainBytes; ++i) {
+            const char* text = next_ + i * sizeof(HexText);
+            const unsigned high = hexDigit(text[0]);
+            const unsigned low = hexDigit(text[1]);
+            wrong |= ((high | low) & 0xF0U) | static_cast<unsigned>(text[2] ^ ' ');
+            bytes[i] = static_cast<std::uint8_t>(high << 4U | low);
+        }
+        if (wrong != 0) {
             return false;
         }
-        byte = static_cast<std::uint8_t>(high << 4U | low);
-        next_ += 3;
+        next_ += kLength;
         return true;
     }
+    static constexpr std::size_t kPlainBytes = 8;
 
     /// False when nothing reads as a number here or the number does not fit.
     bool read(std::uint16_t& value) noexcept {
@@ -202,12 +210,18 @@ void appendHexString(std::string& text, std::span<const std::uint8_t> bytes) {
 }
 
 std::vector<std::uint8_t> bytesFromHexString(std::string_view text) {
+    std::vector<std::uint8_t> bytes;
+    readHexString(text, bytes);
+    return bytes;
+}
+
+void readHexString(std::string_view text, std::vector<std::uint8_t>& bytes) {
     // The usual text has three characters a byte; a text of single digits needs the list to grow.
-    std::vector<std::uint8_t> bytes(text.size() / sizeof(HexText));
+    bytes.resize(text.size() / sizeof(HexText));
     HexNumberReader reader(text);
     std::size_t count = 0;
-    while (count < bytes.size() && reader.readPlainByte(bytes[count])) {
-        ++count;
+    while (reader.readPlainBytes(bytes.data() + count)) {
+        count += HexNumberReader::kPlainBytes;
     }
     bytes.resize(count);
     std::uint16_t value = 0;
@@ -217,7 +231,6 @@ std::vector<std::uint8_t> bytesFromHexString(std::string_view text) {
         }
         bytes.push_back(static_cast<std::uint8_t>(value));
     }
-    return bytes;
 }
 
 bool stripDomainFromKey(std::string& key, const std::string& domain) {

@@ -30,6 +30,8 @@ void appendHexString(std::string& text, std::span<const std::uint8_t> bytes);
 /// does not fit in 16 bits, quietly ends the list.
 /// Throws std::invalid_argument "invalid hex string" for a value of 256 or more.
 std::vector<std::uint8_t> bytesFromHexString(std::string_view text);
+/// The same into `bytes`, whose content is replaced (and unspecified after a throw).
+void readHexString(std::string_view text, std::vector<std::uint8_t>& bytes);
 
 /// If `key` begins with `domain` and a dot (compared up to a zero byte), removes both and returns
 /// true; otherwise leaves the key alone and returns false.
