@@ -5,7 +5,9 @@ set(CMAKE_CXX_EXTENSIONS OFF)
 if(NOT DEFINED CMAKE_CXX_COMPILER_LAUNCHER)
     find_program(VEXA_CCACHE ccache)
     if(VEXA_CCACHE)
-        set(CMAKE_CXX_COMPILER_LAUNCHER "${VEXA_CCACHE}")
+        # Without the build folder in the key, presets with equal flags share what they compile.
+        set(CMAKE_CXX_COMPILER_LAUNCHER "${CMAKE_COMMAND}" -E env CCACHE_NOHASHDIR=1
+                                        "${VEXA_CCACHE}")
     endif()
 endif()
 
@@ -37,12 +39,8 @@ if(VEXA_SANITIZE)
     add_link_options(-fsanitize=${VEXA_SANITIZE})
 endif()
 
-if(VEXA_FUZZ)
-    if(NOT CMAKE_CXX_COMPILER_ID MATCHES "Clang")
-        message(FATAL_ERROR "VEXA_FUZZ needs clang (use the preset `fuzz`)")
-    endif()
-    # Every layer is instrumented, the driver is linked into the fuzz targets alone.
-    add_compile_options(-fsanitize=fuzzer-no-link)
+if(VEXA_FUZZ AND NOT VEXA_SANITIZE MATCHES "fuzzer-no-link")
+    message(FATAL_ERROR "VEXA_FUZZ needs clang and instrumented layers (use the preset `fuzz`)")
 endif()
 
 if(VEXA_COVERAGE)
