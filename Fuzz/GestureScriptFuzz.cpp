@@ -1,14 +1,13 @@
 // Any text is a script or is refused in one printable line that names a line of it; a script makes
 // frames whose time goes forward, whose images are images, and that a pipeline takes.
 
+#include "Fuzz/FuzzInput.h"
 #include "Pipeline/Pipeline.h"
 #include "Tools/GestureScript.h"
 #include "Tools/SurfaceSynthesizer.h"
 
 #include <algorithm>
 #include <cstdint>
-#include <cstdlib>
-#include <iostream>
 #include <string>
 #include <string_view>
 
@@ -16,19 +15,13 @@ namespace {
 
 using namespace VexaTouch;
 using namespace VexaTouch::Tools;
+using VexaTouch::Fuzz::require;
 using Frame = PipelineRecording::Frame;
 
 // Enough to reach every command of a script that a person would write.
 constexpr std::uint64_t kMostFrames = 3000;
 
 struct EnoughFrames {};
-
-void require(bool holds, const char* what) {
-    if (!holds) {
-        std::cerr << "does not hold: " << what << "\n";
-        std::abort();
-    }
-}
 
 void checkError(const GestureScriptError& error, std::string_view text) {
     const std::string_view message = error.what();

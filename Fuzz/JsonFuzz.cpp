@@ -1,14 +1,11 @@
 // Any text reads to a value or to none, whole or in pieces alike; a value is written and reads back
 // as its documented normal form.
 
+#include "Fuzz/FuzzInput.h"
 #include "Platform/Json.h"
 
-#include <algorithm>
 #include <cmath>
 #include <cstdint>
-#include <cstdlib>
-#include <functional>
-#include <iostream>
 #include <string>
 #include <string_view>
 
@@ -18,22 +15,13 @@ using Vexa::JsonParser;
 using Vexa::JsonValueBuilder;
 using Vexa::JsonWriter;
 using Vexa::PropertyValue;
+using VexaTouch::Fuzz::require;
 
-void require(bool holds, const char* what) {
-    if (holds) return;
-    std::cerr << "does not hold: " << what << "\n";
-    std::abort();
-}
-
-PropertyValue readInPieces(std::string_view text, std::uint32_t seed, std::uint32_t longest) {
+PropertyValue readInPieces(std::string_view text, std::size_t longest) {
     JsonValueBuilder builder;
     JsonParser parser(builder);
-    while (!text.empty()) {
-        seed = seed * 1664525u + 1013904223u;
-        const std::size_t size = std::min<std::size_t>(text.size(), 1 + (seed >> 16) % longest);
-        if (!parser.write(text.substr(0, size))) return {};
-        text.remove_prefix(size);
-    }
+    VexaTouch::Fuzz::inPieces(text, longest,
+                              [&](std::string_view piece) { return parser.write(piece); });
     return parser.finish() ? builder.take() : PropertyValue();
 }
 
@@ -58,10 +46,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const std::string_view text(reinterpret_cast<const char*>(data), size);
     const PropertyValue value = Vexa::readJson(text);
 
-    const auto seed = static_cast<std::uint32_t>(std::hash<std::string_view>()(text));
-    require(readInPieces(text, seed, 1) == value, "byte by byte as whole");
-    require(readInPieces(text, seed, 7) == value, "in short pieces as whole");
-    require(readInPieces(text, seed, 100) == value, "in long pieces as whole");
+    require(readInPieces(text, 1) == value, "byte by byte as whole");
+    require(readInPieces(text, 7) == value, "in short pieces as whole");
+    require(readInPieces(text, 100) == value, "in long pieces as whole");
     if (!value) return 0;
 
     require(!value.description().empty(), "a value has a description");
