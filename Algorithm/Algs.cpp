@@ -25,6 +25,25 @@ Vexa::HidEvent createEvent(std::uint32_t eventMask, PixelRegion region, Vexa::Hi
     return event;
 }
 
+/// The gains that the virtual pixels are built with, for all of them at once.
+constexpr std::array<float, kVirtualPixelCount> kGroupGains = [] {
+    std::array<float, kVirtualPixelCount> gains{};
+    std::ranges::transform(kPixelGroups, gains.begin(), &PixelGroup::normalizationFactor);
+    return gains;
+}();
+
+/// Values and progress of many channels: a plain loop, which compilers turn into steps on several
+/// channels at once.
+template <std::size_t n>
+void scale(const std::int16_t* samples, const std::array<float, n>& gains,
+           float activationThreshold, std::span<std::int32_t, n> values,
+           std::array<float, n>& progress) noexcept {
+    for (std::size_t i = 0; i < n; ++i) {
+        values[i] = scaledSample(samples[i], gains[i]);
+        progress[i] = progressOf(values[i], activationThreshold);
+    }
+}
+
 }  // namespace
 
 Algs::Algs() {
@@ -57,7 +76,6 @@ void Algs::processTouchFrame(const std::int16_t* samples, std::uint32_t frameNum
                              std::uint32_t timeMs, std::vector<Vexa::HidEvent>& events) {
     ChannelSummary channels;
     updatePixels(samples, channels);
-    _virtual_image.updateValues(std::span(channels.values).first<kPixelCount>());
     updateVirtualPixels(channels);
     _handStats.updateHandState(_touchPixels, _virtualPixels, channels, timeMs);
     decideEvent(frameNumber, events);
@@ -68,49 +86,70 @@ void Algs::processTouchFrame(const std::int16_t* samples, std::uint32_t frameNum
 }
 
 void Algs::updatePixels(const std::int16_t* samples, ChannelSummary& channels) noexcept {
-    const float threshold = _handStats._activationThreshold;
+    const std::span<std::int32_t, kPixelCount> values =
+        std::span(channels.values).first<kPixelCount>();
+    std::array<float, kPixelCount> progress;
+    scale<kPixelCount>(samples, kPixelGains, _handStats._activationThreshold, values, progress);
     for (std::size_t i = 0; i < kPixelCount; ++i) {
-        Pixel& pixel = _touchPixels[i];
-        pixel.updatePixelState(samples[i], threshold);
-        channels.add(i, pixel);
+        _touchPixels[i].takeProgress(values[i], progress[i]);
+        channels.addActivity(_touchPixels[i]);
     }
+    channels.addValues(values);
+    channels.anyAboveNoise = channels.aboveNoise != 0;
 }
 
 void Algs::updateVirtualPixels(ChannelSummary& channels) {
+    const float threshold = _handStats._activationThreshold;
+    const auto thresholdBits = std::bit_cast<std::uint32_t>(threshold);
+    const bool sameThreshold = quietThresholdBits_ == thresholdBits;
+    const std::span<std::int32_t, kVirtualPixelCount> values =
+        std::span(channels.values).last<kVirtualPixelCount>();
+    if (!channels.anyAboveNoise && virtualPixelsQuiet_ && sameThreshold) {
+        std::ranges::fill(values, 0);
+        channels.largestValue = std::max(channels.largestValue, 0);
+    } else {
+        virtualPixelsQuiet_ = false;
+        quietThresholdBits_ = thresholdBits;
+        updateVirtualPixels(channels, values, sameThreshold);
+    }
+    if (channels.anyAboveNoise || channels.anyActive) {
+        channels.countNeverActive(_touchPixels, _virtualPixels);
+        neverActive_ = channels.neverActive;
+    } else {
+        channels.neverActive = neverActive_;
+        virtualPixelsQuiet_ = true;
+    }
+}
+
+void Algs::updateVirtualPixels(ChannelSummary& channels,
+                               std::span<std::int32_t, kVirtualPixelCount> values,
+                               bool sameThreshold) {
+    _virtual_image.updateValues(std::span(channels.values).first<kPixelCount>());
     if (_virtualPixels.size() < kVirtualPixelCount ||
         _virtual_image._values.size() < kVirtualPixelCount ||
         _virtual_image._maxPixelIndex.size() < kVirtualPixelCount) {
         throwAtMissingVirtualPixel();
     }
-    const float threshold = _handStats._activationThreshold;
-    const auto thresholdBits = std::bit_cast<std::uint32_t>(threshold);
-    const bool sameThreshold = quietThresholdBits_ == thresholdBits;
-    quietThresholdBits_ = thresholdBits;
-
-    if (channels.aboveNoise == 0 && virtualPixelsQuiet_ && sameThreshold) {
-        std::fill_n(channels.values.begin() + kPixelCount, kVirtualPixelCount, 0);
-        channels.largestValue = std::max(channels.largestValue, 0);
-    } else {
-        virtualPixelsQuiet_ = channels.aboveNoise == 0;
-        for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
-            VirtualPixel& pixel = _virtualPixels[i];
-            // The low 16 bits count: a strong group's sum deliberately wraps.
-            const auto sample = static_cast<std::int16_t>(_virtual_image._values[i]);
-            if (sample != 0 || pixel._value != 0 || pixel._isActive || !sameThreshold) {
-                pixel.updatePixelState(sample, threshold, _virtual_image._maxPixelIndex[i]);
-                virtualPixelsQuiet_ = virtualPixelsQuiet_ && !pixel._isActive;
-            } else {
-                pixel._index = _virtual_image._maxPixelIndex[i];
-            }
-            channels.add(kPixelCount + i, pixel);
+    // The low 16 bits count: a strong group's sum deliberately wraps.
+    std::array<std::int16_t, kVirtualPixelCount> samples;
+    std::transform(_virtual_image._values.begin(),
+                   _virtual_image._values.begin() + kVirtualPixelCount, samples.begin(),
+                   [](std::int32_t sum) { return static_cast<std::int16_t>(sum); });
+    std::array<float, kVirtualPixelCount> progress;
+    scale<kVirtualPixelCount>(samples.data(), kGroupGains, _handStats._activationThreshold, values,
+                              progress);
+    for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
+        VirtualPixel& pixel = _virtualPixels[i];
+        const std::int32_t strongest = _virtual_image._maxPixelIndex[i];
+        // One that is inactive at value 0 cannot change by another 0 at the same threshold.
+        if (values[i] != 0 || pixel._value != 0 || pixel._isActive || !sameThreshold) {
+            pixel.takeProgress(values[i], progress[i], strongest);
+            channels.addActivity(pixel);
+        } else {
+            pixel._index = strongest;
         }
     }
-    if (channels.aboveNoise != 0 || channels.anyActive) {
-        channels.countNeverActive(_touchPixels, _virtualPixels);
-        neverActive_ = channels.neverActive;
-    } else {
-        channels.neverActive = neverActive_;
-    }
+    channels.addValues(values);
 }
 
 void Algs::throwAtMissingVirtualPixel() {

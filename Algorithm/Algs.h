@@ -13,6 +13,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -89,6 +90,9 @@ protected:
 private:
     void updatePixels(const std::int16_t* samples, ChannelSummary& channels) noexcept;
     void updateVirtualPixels(ChannelSummary& channels);
+    void updateVirtualPixels(ChannelSummary& channels,
+                             std::span<std::int32_t, kVirtualPixelCount> values,
+                             bool sameThreshold);
     /// Updates the virtual pixels up to the one that lacks an element, and throws.
     [[noreturn]] void throwAtMissingVirtualPixel();
     void decideEvent(std::uint32_t frameNumber, std::vector<Vexa::HidEvent>& events);
@@ -96,8 +100,8 @@ private:
                   std::uint32_t timeMs) const;
     [[nodiscard]] std::string describeFrame(const std::string& channels, unsigned int timeMs) const;
 
-    // A virtual pixel that was left inactive at value 0 cannot change by another sample of 0 at the
-    // same threshold. After a frame of such pixels alone, all of them are quiet.
+    // After a frame without any channel above noise or active, another one at the same threshold
+    // leaves all virtual pixels as they are. Most frames are of this kind.
     bool virtualPixelsQuiet_ = false;
     std::optional<std::uint32_t> quietThresholdBits_;
     // ChannelSummary::neverActive, which only frames above noise and resets change.

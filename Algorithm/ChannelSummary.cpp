@@ -1,5 +1,6 @@
 #include "Algorithm/ChannelSummary.h"
 
+#include <algorithm>
 #include <stdexcept>
 
 namespace VexaTouch {
@@ -10,13 +11,15 @@ ChannelSummary ChannelSummary::of(const std::vector<Pixel>& pixels,
         throw std::out_of_range("there must be 15 pixels and 23 virtual pixels");
     }
     ChannelSummary summary;
-    std::size_t channel = 0;
-    for (const Pixel& pixel : pixels) {
-        summary.add(channel++, pixel);
-    }
-    for (const VirtualPixel& pixel : virtualPixels) {
-        summary.add(channel++, pixel);
-    }
+    auto value = summary.values.begin();
+    const auto look = [&](const Pixel& pixel) {
+        *value++ = pixel._value;
+        summary.anyAboveNoise |= pixel._isAboveNoise;
+        summary.addActivity(pixel);
+    };
+    std::ranges::for_each(pixels, look);
+    std::ranges::for_each(virtualPixels, look);
+    summary.addValues(summary.values);
     summary.countNeverActive(pixels, virtualPixels);
     return summary;
 }

@@ -20,7 +20,8 @@ inline constexpr std::size_t kChannelCount = kPixelCount + kVirtualPixelCount;
 struct ChannelSummary {
     std::array<std::int32_t, kChannelCount> values;  ///< `_value` of each channel
     std::int32_t largestValue = std::numeric_limits<std::int32_t>::min();
-    std::int32_t aboveNoise = 0;  ///< channels above noise in this frame
+    std::int32_t aboveNoise = 0;  ///< channels whose `_value` is above noise
+    bool anyAboveNoise = false;   ///< some channel's `_isAboveNoise` is set
     /// Channels that rose above noise during the touch but never became active.
     std::int32_t neverActive = 0;
     bool anyActive = false;
@@ -31,11 +32,15 @@ struct ChannelSummary {
     static ChannelSummary of(const std::vector<Pixel>& pixels,
                              const std::vector<VirtualPixel>& virtualPixels);
 
-    /// Takes in the frame's state of one channel; all but `neverActive`.
-    void add(std::size_t channel, const Pixel& pixel) noexcept {
-        values[channel] = pixel._value;
-        largestValue = pixel._value > largestValue ? pixel._value : largestValue;
-        aboveNoise += pixel._isAboveNoise ? 1 : 0;
+    /// Takes in some channels' values, which are in their places already.
+    void addValues(std::span<const std::int32_t> some) noexcept {
+        for (const std::int32_t value : some) {
+            largestValue = value > largestValue ? value : largestValue;
+            aboveNoise += static_cast<std::int32_t>(value > kNoiseLevel);
+        }
+    }
+    /// Takes in whether a channel is active, and how much.
+    void addActivity(const Pixel& pixel) noexcept {
         if (pixel._isActive) {
             anyActive = true;
             activeProgress = largerOrOld(pixel._progress, activeProgress);

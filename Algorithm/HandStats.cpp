@@ -116,7 +116,7 @@ void HandStats::shiftTouchFlags(const ChannelSummary& channels) noexcept {
     _wasTouching = _isTouching;
     _isTouching = channels.anyActive;
     _wasAboveNoiseLevel = _isAboveNoiseLevel;
-    _isAboveNoiseLevel = channels.aboveNoise != 0;
+    _isAboveNoiseLevel = channels.anyAboveNoise;
 }
 
 void HandStats::stampEdges(unsigned int timeMs) noexcept {

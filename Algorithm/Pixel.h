@@ -16,6 +16,16 @@ constexpr float smallerOrOld(float candidate, float old) noexcept {
     return candidate < old ? candidate : old;
 }
 
+/// A raw sample times its channel's gain, truncated toward zero.
+constexpr std::int32_t scaledSample(int sample, float gain) noexcept {
+    return static_cast<std::int32_t>(static_cast<float>(sample) * gain);
+}
+
+/// A scaled sample in units of the activation threshold.
+constexpr float progressOf(std::int32_t value, float activationThreshold) noexcept {
+    return static_cast<float>(value) / activationThreshold;
+}
+
 /// The per-frame state of one sensor channel: the scaled sample, its progress toward the activation
 /// threshold, an on/off decision with hysteresis and statistics that accumulate over one touch.
 class Pixel {
@@ -27,6 +37,9 @@ public:
     /// One frame's update. `sample` is the frame's raw value within 16 signed bits,
     /// `activationThreshold` the value that counts as progress 1.0; any float is accepted.
     void updatePixelState(int sample, float activationThreshold) noexcept;
+
+    /// The rest of updatePixelState, from the scaled sample and its progress on.
+    void takeProgress(std::int32_t value, float progress) noexcept;
 
     /// The region of `_index`.
     [[nodiscard]] PixelRegion getPixelRegion() const noexcept { return pixelRegionOfIndex(_index); }
@@ -48,9 +61,14 @@ public:
 };
 
 inline void Pixel::updatePixelState(int sample, float activationThreshold) noexcept {
+    const std::int32_t value = scaledSample(sample, _normalizationFactor);
+    takeProgress(value, progressOf(value, activationThreshold));
+}
+
+inline void Pixel::takeProgress(std::int32_t value, float progress) noexcept {
     constexpr float kHysteresis = 0.6F;
-    _value = static_cast<std::int32_t>(static_cast<float>(sample) * _normalizationFactor);
-    _progress = static_cast<float>(_value) / activationThreshold;
+    _value = value;
+    _progress = progress;
     // The decision of the previous frame chooses the edge of the hysteresis. The edge to turn on
     // is never below 1.0, so most pixels need not know theirs.
     if (_isActive) {

@@ -20,6 +20,12 @@ public:
         _index = maxPixelIndex;
     }
 
+    /// The same from the scaled sample and its progress on.
+    void takeProgress(std::int32_t value, float progress, int maxPixelIndex) noexcept {
+        Pixel::takeProgress(value, progress);
+        _index = maxPixelIndex;
+    }
+
     std::string _name;  ///< the letters of the group, such as "ABE"
 };
 
