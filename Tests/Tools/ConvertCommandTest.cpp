@@ -1,6 +1,7 @@
 #include "Tests/Support/Touch.h"
 #include "Tests/Tools/CommandRun.h"
 #include "Tests/Tools/RecordedSession.h"
+#include "Tools/EventRecord.h"
 #include "Tools/RecordingCut.h"
 #include "Tools/RecordingRecovery.h"
 
@@ -22,6 +23,7 @@ using Frames = std::list<PipelineRecording::Frame>;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using ::testing::Not;
+using ::testing::Pair;
 using Tools::CutPlace;
 
 /// What converting this text gives on standard output, and the lines on the error stream.
@@ -156,6 +158,37 @@ TEST(ConvertCommand, WarnsWhenACutBeginsInMidTouch) {
     EXPECT_THAT(convert(text, {"--from", "6"}).error, ElementsAre(kMidTouch, summary(125, 119)));
     EXPECT_THAT(convert(text, {"--from", "17"}).error, ElementsAre(kMidTouch, summary(125, 108)));
     EXPECT_THAT(convert(text, {"--from", "18"}).error, ElementsAre(summary(125, 107)));
+}
+
+/// The events of a recording, as kind and recorded time in ms.
+std::vector<std::pair<std::string, std::uint64_t>> eventsOf(const std::string& container) {
+    std::vector<std::pair<std::string, std::uint64_t>> events;
+    for (const std::string& line : linesOf(runCommand({"replay", "--json", "-"}, container).out)) {
+        const Tools::EventRecord event = Tools::eventFromJson(line);
+        events.emplace_back(Tools::eventKindName(event.kind), event.timeNs / 1'000'000);
+    }
+    return events;
+}
+
+// What a cut loses: the touch begins anew where the recording does, and its hold starts that much
+// later. What follows is as before.
+TEST(ConvertCommand, ACutInMidTouchBeginsTheTouchAnew) {
+    RecordedSession session;
+    session.feel(nothing().forMs(50))
+        .feel(touch("A").at(350).with("B", 150).forMs(1000))
+        .feel(nothing().forMs(2000))
+        .feel(touch("H").at(350).with("I", 150).forMs(100))
+        .feel(nothing());
+    EXPECT_THAT(eventsOf(session.text()),
+                ElementsAre(Pair("may-begin", 5050), Pair("hold-start", 5560),
+                            Pair("hold-end", 6050), Pair("may-begin", 8050), Pair("tap", 8150)));
+    for (const std::vector<std::string>& cut :
+         {std::vector<std::string>{"--from", "300ms"}, {"--trim", "286"}}) {
+        EXPECT_THAT(
+            eventsOf(convert(session.text(), cut).out),
+            ElementsAre(Pair("may-begin", 5300), Pair("hold-start", 5810), Pair("hold-end", 6050),
+                        Pair("may-begin", 8050), Pair("tap", 8150)));
+    }
 }
 
 TEST(ConvertCommand, TrimsAsABoundedRecordingDoes) {
