@@ -81,12 +81,15 @@ FrameView::FrameView(ColorDepth depth, std::size_t columns, std::uint64_t startN
       frameCount_(frameCount),
       picture_(depth, columns) {}
 
-std::vector<std::string> FrameView::lines(const PlayedFrame& played, const Algs& algs) {
+void FrameView::see(const PlayedFrame& played) noexcept {
     if (played.type == PlayedType::Image) {
         deviceMs_ = played.image.timestampMs;
     } else if (played.type == PlayedType::Firmware && played.firmware.code == 0) {
         deviceMs_ = 0;  // a reset is an image of nothing at time 0
     }
+}
+
+std::vector<std::string> FrameView::lines(const PlayedFrame& played, const Algs& algs) const {
     const HandStats& hand = algs.handStats();
     std::vector<std::string> lines = {heading(played), std::string()};
     for (std::string& line : picture_.lines(algs)) {

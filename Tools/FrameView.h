@@ -24,9 +24,12 @@ public:
     /// Lines of a view, always as many.
     static constexpr std::size_t kLines = SurfacePicture::kRows + 6;
 
-    /// The view of a frame, without line feeds, no line wider than the terminal. A frame that is no
-    /// image is shown over the surface as the last image left it.
-    [[nodiscard]] std::vector<std::string> lines(const PlayedFrame& played, const Algs& algs);
+    /// Takes note of a played frame. Every frame up to the one that is shown must be seen.
+    void see(const PlayedFrame& played) noexcept;
+
+    /// The view of the frame that was seen last, without line feeds, no line wider than the
+    /// terminal. A frame that is no image is shown over the surface as the last image left it.
+    [[nodiscard]] std::vector<std::string> lines(const PlayedFrame& played, const Algs& algs) const;
 
     /// One event with its time: "  1.234 s  tap         volume up".
     [[nodiscard]] std::string eventLine(const EventRecord& event) const;

@@ -162,14 +162,14 @@ void printFrames(Replay& replay, const FrameRange& range, ColorDepth depth, Stre
                    replay.frames().size());
     while (replay.canContinue() && replay.counts().frames < range.end) {
         const PlayedFrame& played = replay.next();
-        const std::vector<std::string> lines = view.lines(played, replay.algs());
+        view.see(played);
         if (played.index < range.begin) {
             continue;
         }
         if (played.index > range.begin) {
             streams.out << '\n';
         }
-        for (const std::string& line : lines) {
+        for (const std::string& line : view.lines(played, replay.algs())) {
             streams.out << line << '\n';
         }
     }
@@ -267,6 +267,7 @@ private:
     }
 
     void remember(const PlayedFrame& played) {
+        view_.see(played);
         lines_ = view_.lines(played, replay_.algs());
         timeNs_ = played.frame->timestamp;
         for (const EventRecord& event : played.events) {
