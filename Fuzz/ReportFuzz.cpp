@@ -9,7 +9,10 @@
 #include "Tests/Support/StateSnapshot.h"
 #include "Tools/EventRecord.h"
 
+#include <algorithm>
+#include <array>
 #include <bit>
+#include <cmath>
 #include <cstdint>
 #include <limits>
 #include <string>
@@ -173,13 +176,10 @@ private:
     }
 
     [[nodiscard]] bool settingsHaveJsonForm() const {
-        for (const PipelineRecording::Frame& frame : recording_.frames()) {
-            const double value = frame.value.toDouble();
-            if (frame.value && !(value - value == 0)) {
-                return false;  // not finite: written as null
-            }
-        }
-        return true;
+        // A number that is not finite is written as null.
+        return std::ranges::all_of(recording_.frames(), [](const PipelineRecording::Frame& frame) {
+            return std::isfinite(frame.value.toDouble());
+        });
     }
 
     FuzzInput input_;

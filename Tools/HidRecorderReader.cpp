@@ -20,8 +20,8 @@ constexpr bool isBlank(char c) noexcept {
 }
 
 // What a faulty line throws; the line's number is added where it is known.
-[[noreturn]] void fault(std::string what) {
-    throw std::invalid_argument(std::move(what));
+[[noreturn]] void fault(const std::string& what) {
+    throw std::invalid_argument(what);
 }
 
 // A piece of the text for a message: short, and nothing that a terminal would act on.

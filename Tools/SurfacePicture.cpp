@@ -17,7 +17,7 @@ constexpr std::size_t kWidePad = 9;
 constexpr std::size_t kNarrowPad = 8;
 
 struct ColorStop {
-    float progress;
+    float progress = 0;
     Rgb color;
 };
 
