@@ -64,9 +64,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
             Testing::imageReport(touches ? Testing::touch("AHN").at(350) : Testing::nothing(),
                                  frameNumber, 200 * frameNumber);
         recording.handleInputReport(report.data(), report.size());
-        const auto image = InputReport::Image::parse(report.data(), report.size());
-        require(image.has_value(), "an image is one");
-        reference.handleImage(*image);
+        if (const auto image = InputReport::Image::parse(report.data(), report.size())) {
+            reference.handleImage(*image);
+        }
         const auto difference = Testing::firstDifference(recording.algs(), reference);
         require(!difference.has_value(), difference.value_or(""));
     }
