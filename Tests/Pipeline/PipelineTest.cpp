@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -416,6 +417,18 @@ TEST(PipelineTest, AClearedProbeIsSkipped) {
     watched.pipeline.invalidInputReportProbe = nullptr;
     watched.send({7});
     EXPECT_THAT(watched.lately(), IsEmpty());
+}
+
+TEST(PipelineTest, AProbeMadeOfAnEmptyFunctionIsEmpty) {
+    Pipeline pipeline;
+    pipeline.setTimeProbe = std::function<void(std::uint64_t)>();
+    void (*nobody)(std::uint64_t) = nullptr;
+    EXPECT_FALSE(pipeline.setTimeProbe);
+    pipeline.setTime(7);
+    pipeline.setTimeProbe = nobody;
+    EXPECT_FALSE(pipeline.setTimeProbe);
+    pipeline.setTime(8);
+    EXPECT_EQ(pipeline.timeMach(), 8U);
 }
 
 TEST(PipelineTest, AProbeMayClearItself) {
