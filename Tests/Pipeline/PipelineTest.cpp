@@ -510,7 +510,7 @@ TEST(PipelineDeathTest, AFailingProbeEndsTheProcess) {
     const Bytes reset = firmwareReport(0);
     EXPECT_DEATH(withProbe(&Pipeline::setTimeProbe).setTime(1), kTerminated);
     EXPECT_DEATH(withProbe(&Pipeline::setStateProbe).setState("Algs.Key", 1), kTerminated);
-    EXPECT_DEATH(withProbe(&Pipeline::getStateProbe).getState("Algs.Key"), kTerminated);
+    EXPECT_DEATH((void)withProbe(&Pipeline::getStateProbe).getState("Algs.Key"), kTerminated);
     EXPECT_DEATH(withProbe(&Pipeline::inputReportProbe).handleInputReport(nullptr, 0), kTerminated);
     EXPECT_DEATH(withProbe(&Pipeline::invalidInputReportProbe).handleInputReport(nullptr, 0),
                  kTerminated);
