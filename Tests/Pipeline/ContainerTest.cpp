@@ -22,6 +22,7 @@ namespace VexaTouch {
 namespace {
 
 using ::testing::IsEmpty;
+using namespace std::string_literals;
 using namespace Testing;
 using Bytes = std::vector<std::uint8_t>;
 using Frame = PipelineRecording::Frame;
@@ -119,12 +120,13 @@ TEST(ContainerWriteTest, AFrameOfUnknownTypeIsSkipped) {
 }
 
 TEST(ContainerWriteTest, FramesOfEveryKindReadBack) {
+    using namespace std::string_literals;
     const Frames all = {
         reportFrame(0, {}),
         reportFrame(~std::uint64_t{0}, imageReport(touch("A").at(350), 1, 10)),
         reportFrame(1, Bytes(65'536, 0xFF)),
         stateFrame(2, "", ""),
-        stateFrame(3, "quote \" back \\ slash / line \n zero \0 é 漢 😀", "é\"\\\n"),
+        stateFrame(3, "quote \" back \\ slash / line \n zero \0 é 漢 😀"s, "é\"\\\n"s),
         stateFrame(4, "a", true),
         stateFrame(5, "a", std::numeric_limits<std::uint64_t>::max()),
         stateFrame(6, "a", std::numeric_limits<std::int64_t>::min()),
