@@ -25,6 +25,9 @@ Vexa::HidEvent createEvent(std::uint32_t eventMask, PixelRegion region, Vexa::Hi
     return event;
 }
 
+// Frames take the gains from the tables that the pixels are built with: `_normalizationFactor` is
+// fixed at construction.
+
 /// The gains that the virtual pixels are built with, for all of them at once.
 constexpr std::array<float, kVirtualPixelCount> kGroupGains = [] {
     std::array<float, kVirtualPixelCount> gains{};
@@ -99,6 +102,13 @@ void Algs::updatePixels(const std::int16_t* samples, ChannelSummary& channels) n
 }
 
 void Algs::updateVirtualPixels(ChannelSummary& channels) {
+    if (_virtualPixels.size() < kVirtualPixelCount ||
+        _virtual_image._values.size() < kVirtualPixelCount ||
+        _virtual_image._maxPixelIndex.size() < kVirtualPixelCount) {
+        quietThresholdBits_.reset();
+        _virtual_image.updateValues(std::span(channels.values).first<kPixelCount>());
+        throwAtMissingVirtualPixel();
+    }
     const float threshold = _handStats._activationThreshold;
     const auto thresholdBits = std::bit_cast<std::uint32_t>(threshold);
     const bool sameThreshold = quietThresholdBits_ == thresholdBits;
@@ -125,11 +135,6 @@ void Algs::updateVirtualPixels(ChannelSummary& channels,
                                std::span<std::int32_t, kVirtualPixelCount> values,
                                bool sameThreshold) {
     _virtual_image.updateValues(std::span(channels.values).first<kPixelCount>());
-    if (_virtualPixels.size() < kVirtualPixelCount ||
-        _virtual_image._values.size() < kVirtualPixelCount ||
-        _virtual_image._maxPixelIndex.size() < kVirtualPixelCount) {
-        throwAtMissingVirtualPixel();
-    }
     // The low 16 bits count: a strong group's sum deliberately wraps.
     std::array<std::int16_t, kVirtualPixelCount> samples;
     std::transform(_virtual_image._values.begin(),

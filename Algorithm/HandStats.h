@@ -25,8 +25,8 @@ public:
     void Reset() noexcept;
 
     /// The per-frame step, after all channels had theirs. `pixels` holds kPixelCount elements.
-    /// Throws std::out_of_range when there are fewer than kVirtualPixelCount virtual pixels; the
-    /// update is then abandoned part-way.
+    /// Throws std::out_of_range when there are not kPixelCount and kVirtualPixelCount channels,
+    /// before anything has changed.
     void updateHandState(const std::vector<Pixel>& pixels,
                          const std::vector<VirtualPixel>& virtualPixels, unsigned int timeMs);
     /// The same for whoever has the summary of these very channels already.

@@ -11,7 +11,7 @@ namespace {
 constexpr std::uint32_t kResetUsagePage = 0xFF60;
 constexpr std::uint32_t kResetUsage = 2;
 
-/// The key without the algorithm's domain, or nothing when it is of another.
+/// Removes the algorithm's domain from the key; false when it is of another.
 bool stripAlgorithmDomain(std::string& key) {
     static const std::string domain = "Algs";
     return Util::stripDomainFromKey(key, domain);

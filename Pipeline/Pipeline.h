@@ -5,6 +5,7 @@
 #include "Platform/PropertyValue.h"
 #include "Shared/InputReport.h"
 
+#include <concepts>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
@@ -24,8 +25,13 @@ public:
     Probe(std::nullptr_t) {}
     template <typename F>
         requires std::invocable<F&, Arguments...>
-    Probe(F callable)
-        : closure_(std::make_shared<std::function<void(Arguments...)>>(std::move(callable))) {}
+    Probe(F callable) {
+        std::function<void(Arguments...)> closure(std::move(callable));
+        if (closure) {  // an empty function or null pointer makes an empty probe
+            closure_ =
+                std::make_shared<const std::function<void(Arguments...)>>(std::move(closure));
+        }
+    }
 
     explicit operator bool() const noexcept { return closure_ != nullptr; }
 

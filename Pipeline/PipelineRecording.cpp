@@ -16,9 +16,9 @@ namespace {
 using Frame = PipelineRecording::Frame;
 using FrameList = std::list<Frame>;
 
-/// Trims as PipelineRecording::trimFrames does; true if the frame at `watched` was erased.
-bool trim(FrameList& frames, std::size_t maxCount, FrameList::const_iterator watched) {
-    bool watchedErased = false;
+/// Trims as PipelineRecording::trimFrames does. `erase` erases a frame and returns the next one.
+template <typename Erase>
+void trim(FrameList& frames, std::size_t maxCount, Erase erase) {
     // Views of kept frames' keys: a kept frame outlives the walk.
     std::unordered_set<std::string_view> seenKeys;
     std::size_t keptReports = 0;
@@ -34,14 +34,8 @@ bool trim(FrameList& frames, std::size_t maxCount, FrameList::const_iterator wat
                 seenKeys.clear();
             }
         }
-        if (keep) {
-            next = frame;
-        } else {
-            watchedErased = watchedErased || frame == watched;
-            next = frames.erase(frame);
-        }
+        next = keep ? frame : erase(frame);
     }
-    return watchedErased;
 }
 
 /// Whole microseconds to wait, clamped before it becomes an integer. The division by the speed is
@@ -132,13 +126,13 @@ void PipelineRecording::appendFrame(Frame frame) {
     // The list grows to twice the cap and is then cut back in one pass. Halving the size instead of
     // doubling the cap keeps a huge cap from overflowing.
     if (_maxFrameCount != 0 && _frames.size() / 2 >= _maxFrameCount) {
-        trimFrames(_frames, _maxFrameCount);
+        trimToCap();
     }
     _play.valid = false;
 }
 
 void PipelineRecording::trimFrames(std::list<Frame>& frames, std::size_t maxCount) {
-    trim(frames, maxCount, frames.end());
+    trim(frames, maxCount, [&](FrameList::iterator frame) { return frames.erase(frame); });
 }
 
 void PipelineRecording::setMaxFrameCount(std::size_t count) {
@@ -150,10 +144,19 @@ void PipelineRecording::trimToCap() {
     if (_maxFrameCount == 0) {
         return;
     }
-    const auto cursor = _play.valid ? FrameList::const_iterator(_play.iterator) : _frames.cend();
-    if (trim(_frames, _maxFrameCount, cursor)) {
-        _play.valid = false;
-    }
+    trim(_frames, _maxFrameCount, [this](FrameList::iterator frame) {
+        const auto next = std::next(frame);
+        if (_play.valid && frame == _play.iterator) {
+            _play.valid = false;
+        }
+        if (_play.current == frame) {
+            // A probe that is being called for this very frame asked for the trim.
+            _play.erasedCurrent.splice(_play.erasedCurrent.end(), _frames, frame);
+        } else {
+            _frames.erase(frame);
+        }
+        return next;
+    });
 }
 
 void PipelineRecording::playReset() {
@@ -171,7 +174,8 @@ void PipelineRecording::playNextFrame(float speed) {
     if (!playCanContinue()) {
         throw std::runtime_error("playback finished");
     }
-    const Frame& frame = *_play.iterator++;
+    _play.current = _play.iterator++;
+    const Frame& frame = **_play.current;
     if (frame.type == Frame::Type::InputReport) {
         waitForFrame(frame, speed > 0.0F ? speed : 1.0F);
     }
@@ -182,6 +186,8 @@ void PipelineRecording::playNextFrame(float speed) {
     } else if (frame.type == Frame::Type::State) {
         Pipeline::setState(frame.key, frame.value);
     }
+    _play.current.reset();
+    _play.erasedCurrent.clear();
 }
 
 void PipelineRecording::waitForFrame(const Frame& frame, float speed) {

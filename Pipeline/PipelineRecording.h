@@ -98,6 +98,9 @@ private:
         std::list<Frame>::iterator iterator;
         std::uint64_t startTimeMach = 0;                     ///< host ticks
         std::optional<std::uint64_t> lastInputReportTimeNs;  ///< recorded time
+        /// The frame being played, while it is: probes may record and trim meanwhile.
+        std::optional<std::list<Frame>::iterator> current;
+        std::list<Frame> erasedCurrent;  ///< keeps that frame when a trim erased it
     };
 
     /// Trims without erasing the frame under the cursor of a running playback unnoticed.

@@ -148,8 +148,8 @@ static_assert(std::ranges::all_of(kImageLayout, [](ImageRow row) {
            std::ranges::all_of(row, [](char c) { return c == ' ' || (c >= 'A' && c <= 'O'); });
 }));
 
-/// Right-aligned in half the width of its run, then as many spaces as its length differs from that
-/// half. The space that closes the run is swallowed, so a short number is one character narrower
+/// Right-aligned in half the width of its run, then as many spaces as its length differs from the
+/// run. The space that closes the run is swallowed, so a short number is one character narrower
 /// than run and space together.
 void appendPixelValue(std::string& line, std::intmax_t value, int runLength) {
     const int field = runLength / 2;

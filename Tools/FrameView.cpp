@@ -1,9 +1,11 @@
 #include "Tools/FrameView.h"
 
 #include "Platform/Json.h"
+#include "Tools/TerminalText.h"
 
 #include <array>
 #include <cstdio>
+#include <utility>
 
 namespace VexaTouch::Tools {
 namespace {
@@ -16,11 +18,7 @@ std::string decimals(float value) {
 
 // Cut to the width of the terminal, and without anything that it would act on.
 std::string fitted(std::string text, std::size_t columns) {
-    for (char& c : text) {
-        if (static_cast<unsigned char>(c) < 0x20 || c == 0x7F) {
-            c = '?';
-        }
-    }
+    text = forTerminal(std::move(text));
     if (text.size() > columns) {
         text.resize(columns);
         // No half of a character in UTF-8.

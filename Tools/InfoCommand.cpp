@@ -5,6 +5,7 @@
 #include "Tools/RecordingFile.h"
 #include "Tools/RecordingSummary.h"
 #include "Tools/Replay.h"
+#include "Tools/TerminalText.h"
 
 #include <array>
 #include <cstdio>
@@ -147,7 +148,7 @@ void printText(const RecordingFile& file, const Replay& replay, const RecordingS
     bool first = true;
     for (const auto& [key, value] : summary.settings()) {
         line(streams, first ? "settings" : "",
-             key + " = " + Vexa::writeJson(value, Vexa::JsonWriter::Style::Compact));
+             forTerminal(key + " = " + Vexa::writeJson(value, Vexa::JsonWriter::Style::Compact)));
         first = false;
     }
     if (first) {

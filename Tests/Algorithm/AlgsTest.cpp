@@ -613,6 +613,24 @@ TEST_F(BrokenAlgsTest, GroupsBeforeTheMissingOneAreUpdated) {
     EXPECT_EQ(algs.virtualPixels()[21]._index, 11);
 }
 
+TEST_F(BrokenAlgsTest, AMissingVirtualPixelIsSeenOnAQuietFrameToo) {
+    EXPECT_THAT(algs.handleImage(image(nothing().samples(), 1, 1000)), IsEmpty());
+    EXPECT_THAT(algs.handleImage(image(nothing().samples(), 2, 1010)), IsEmpty());
+    algs.virtualPixels().pop_back();
+    EXPECT_THROW(algs.handleImage(image(nothing().samples(), 3, 1020)), std::out_of_range);
+}
+
+TEST_F(BrokenAlgsTest, AFrameAfterTheRepairIsWholeAtTheSameThresholdToo) {
+    const VirtualPixel last = algs.virtualPixels().back();
+    algs.setState("ActivationThreshold", std::nan(""));
+    algs.virtualPixels().pop_back();
+    EXPECT_THROW(algs.handleImage(image(nothing().samples(), 1, 1000)), std::out_of_range);
+    algs.virtualPixels().push_back(last);
+    EXPECT_THAT(algs.handleImage(image(nothing().samples(), 2, 1010)), IsEmpty());
+    EXPECT_TRUE(std::isnan(algs.virtualPixels()[0]._progress));
+    EXPECT_TRUE(std::isnan(algs.virtualPixels()[22]._progress));
+}
+
 TEST_F(BrokenAlgsTest, AFrameAfterTheRepairIsWhole) {
     const VirtualPixel last = algs.virtualPixels().back();
     algs.setState("ActivationThreshold", std::nan(""));

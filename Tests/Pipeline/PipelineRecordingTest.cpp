@@ -644,6 +644,49 @@ TEST(PlaybackTest, ATrimAtTheEndLeavesItAtTheEnd) {
     EXPECT_EQ(playFault(playback.recording), "playback finished");
 }
 
+TEST(PlaybackTest, ATrimFromAProbeSparesTheFrameBeingPlayed) {
+    Recorded recorded;
+    for (std::uint8_t i = 0; i < 6; ++i) {
+        recorded.report({i});
+    }
+    std::vector<Bytes> invalid;
+    recorded.recording.invalidInputReportProbe = [&](const std::uint8_t* report,
+                                                     std::uint64_t length) {
+        invalid.emplace_back(report, report + length);
+    };
+    recorded.recording.setTimeProbe = [&](std::uint64_t) {
+        if (invalid.size() == 1) {
+            recorded.recording.setMaxFrameCount(
+                4);  // erases the first two, the second being played
+        }
+    };
+    recorded.recording.playReset();
+    playOn(recorded.recording, std::numeric_limits<float>::infinity());
+    EXPECT_THAT(invalid, ElementsAre(Bytes{0}, Bytes{1}, Bytes{2}, Bytes{3}, Bytes{4}, Bytes{5}));
+    EXPECT_EQ(recorded.recording.frames().size(), 4U);
+}
+
+TEST(PlaybackTest, ALiveReportFromAProbeEndsItAfterTheFrameBeingPlayed) {
+    Recorded recorded;
+    recorded.recording.setMaxFrameCount(2);
+    recorded.report({1});
+    recorded.report({2});
+    recorded.report({3});
+    std::vector<std::uint8_t> seen;
+    recorded.recording.inputReportProbe = [&](const std::uint8_t* report, std::uint64_t) {
+        seen.push_back(*report);
+        if (*report == 1) {
+            recorded.report({9});  // reaches twice the cap: the frame being played goes
+            seen.push_back(*report);
+        }
+    };
+    recorded.recording.playReset();
+    recorded.recording.playNextFrame(1.0F);
+    EXPECT_THAT(seen, ElementsAre(1, 9, 1));
+    EXPECT_FALSE(recorded.recording.playCanContinue());
+    EXPECT_EQ(recorded.recording.frames().size(), 2U);
+}
+
 TEST(PlaybackTest, TheTrimOfWritingCanEndItToo) {
     Playback playback({});
     playback.recording.setMaxFrameCount(3);
