@@ -128,7 +128,7 @@ TEST(RecordingTest, KeepsReportsOfAnyLengthAndContent) {
     recorded.recording.invalidInputReportProbe = [&](const std::uint8_t*, std::uint64_t) {
         ++invalid;
     };
-    for (const std::size_t length : {0, 1, 9, 10, 72, 73, 74, 512, 65'535, 65'536}) {
+    for (const std::size_t length : {0U, 1U, 9U, 10U, 72U, 73U, 74U, 512U, 65'535U, 65'536U}) {
         Bytes report(length);
         for (std::size_t i = 0; i < length; ++i) {
             report[i] = static_cast<std::uint8_t>(i + 3);  // no known id
