@@ -33,6 +33,29 @@ constexpr std::array<std::uint8_t, 256> kHexDigits = [] {
     return digits;
 }();
 
+constexpr std::uint16_t kNotHexPair = 0x100;
+
+/// The first character in the low half, so that a little-endian machine reads both at once.
+constexpr std::size_t pairIndex(char first, char second) noexcept {
+    return static_cast<unsigned char>(first) |
+           static_cast<std::size_t>(static_cast<unsigned char>(second)) << 8U;
+}
+
+/// The byte of every two characters. Of this large table texts touch a few lines only.
+constexpr std::array<std::uint16_t, 65'536> kHexPairs = [] {
+    std::array<std::uint16_t, 65'536> pairs{};
+    pairs.fill(kNotHexPair);
+    constexpr std::string_view digits = "0123456789abcdefABCDEF";
+    for (const char first : digits) {
+        for (const char second : digits) {
+            pairs[pairIndex(first, second)] =
+                static_cast<std::uint16_t>(kHexDigits[static_cast<unsigned char>(first)] << 4U |
+                                           kHexDigits[static_cast<unsigned char>(second)]);
+        }
+    }
+    return pairs;
+}();
+
 using HexText = std::array<char, 3>;  // two digits and a space
 
 constexpr std::array<HexText, 256> kHexTexts = [] {
@@ -68,10 +91,9 @@ public:
         unsigned wrong = 0;
         for (std::size_t i = 0; i < kPlainBytes; ++i) {
             const char* text = next_ + i * sizeof(HexText);
-            const unsigned high = hexDigit(text[0]);
-            const unsigned low = hexDigit(text[1]);
-            wrong |= ((high | low) & 0xF0U) | static_cast<unsigned>(text[2] ^ ' ');
-            bytes[i] = static_cast<std::uint8_t>(high << 4U | low);
+            const unsigned byte = kHexPairs[pairIndex(text[0], text[1])];
+            wrong |= (byte & kNotHexPair) | static_cast<unsigned>(text[2] ^ ' ');
+            bytes[i] = static_cast<std::uint8_t>(byte);
         }
         if (wrong != 0) {
             return false;
