@@ -6,6 +6,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdio>
+#include <cstring>
 #include <cstdlib>
 #include <stdexcept>
 
@@ -56,13 +57,15 @@ constexpr std::array<std::uint16_t, 65'536> kHexPairs = [] {
     return pairs;
 }();
 
-using HexText = std::array<char, 3>;  // two digits and a space
+/// Two digits and a space, and one more character that does not count.
+using HexText = std::array<char, 4>;
+constexpr std::size_t kHexTextLength = 3;
 
 constexpr std::array<HexText, 256> kHexTexts = [] {
     constexpr std::string_view digits = "0123456789abcdef";
     std::array<HexText, 256> texts{};
     for (std::size_t i = 0; i < texts.size(); ++i) {
-        texts[i] = {digits[i / 16], digits[i % 16], ' '};
+        texts[i] = {digits[i / 16], digits[i % 16], ' ', ' '};
     }
     return texts;
 }();
@@ -81,16 +84,17 @@ public:
     explicit HexNumberReader(std::string_view text) noexcept
         : next_(text.data()), end_(text.data() + text.size()) {}
 
-    /// Two digits closed by a space are by far the most common number. Reads eight of them, or
+    /// Two digits closed by a space are by far the most common number. Reads `count` of them, or
     /// nothing when any is of another form.
+    template <std::size_t count>
     bool readPlainBytes(std::uint8_t* bytes) noexcept {
-        constexpr std::ptrdiff_t kLength = kPlainBytes * sizeof(HexText);
+        constexpr std::ptrdiff_t kLength = count * kHexTextLength;
         if (end_ - next_ < kLength) {
             return false;
         }
         unsigned wrong = 0;
-        for (std::size_t i = 0; i < kPlainBytes; ++i) {
-            const char* text = next_ + i * sizeof(HexText);
+        for (std::size_t i = 0; i < count; ++i) {
+            const char* text = next_ + i * kHexTextLength;
             const unsigned byte = kHexPairs[pairIndex(text[0], text[1])];
             wrong |= (byte & kNotHexPair) | static_cast<unsigned>(text[2] ^ ' ');
             bytes[i] = static_cast<std::uint8_t>(byte);
@@ -101,7 +105,6 @@ public:
         next_ += kLength;
         return true;
     }
-    static constexpr std::size_t kPlainBytes = 8;
 
     /// False when nothing reads as a number here or the number does not fit.
     bool read(std::uint16_t& value) noexcept {
@@ -223,12 +226,16 @@ std::string hexStringFromBytes(const std::vector<std::uint8_t>& bytes) {
 }
 
 void appendHexString(std::string& text, std::span<const std::uint8_t> bytes) {
+    // Each byte's text is written with a fourth character, which the next one overwrites.
     const std::size_t start = text.size();
-    text.resize(start + bytes.size() * sizeof(HexText));
+    const std::size_t end = start + bytes.size() * kHexTextLength;
+    text.resize(end + 1);
     char* out = text.data() + start;
     for (const std::uint8_t byte : bytes) {
-        out = std::ranges::copy(kHexTexts[byte], out).out;
+        std::memcpy(out, kHexTexts[byte].data(), sizeof(HexText));
+        out += kHexTextLength;
     }
+    text.resize(end);
 }
 
 std::vector<std::uint8_t> bytesFromHexString(std::string_view text) {
@@ -239,11 +246,15 @@ std::vector<std::uint8_t> bytesFromHexString(std::string_view text) {
 
 void readHexString(std::string_view text, std::vector<std::uint8_t>& bytes) {
     // The usual text has three characters a byte; a text of single digits needs the list to grow.
-    bytes.resize(text.size() / sizeof(HexText));
+    bytes.resize(text.size() / kHexTextLength);
     HexNumberReader reader(text);
     std::size_t count = 0;
-    while (reader.readPlainBytes(bytes.data() + count)) {
-        count += HexNumberReader::kPlainBytes;
+    constexpr std::size_t kMany = 8;
+    while (reader.readPlainBytes<kMany>(bytes.data() + count)) {
+        count += kMany;
+    }
+    while (reader.readPlainBytes<1>(bytes.data() + count)) {
+        ++count;
     }
     bytes.resize(count);
     std::uint16_t value = 0;
