@@ -48,12 +48,12 @@ Frames makeFrames() {
     }
     // As many settings as a session of somebody who tunes has.
     std::size_t position = 0;
-    for (auto frame = frames.begin(); frame != frames.end(); ++frame) {
+    for (Frame& frame : frames) {
         if (++position % 1000 == 0) {
-            frame->type = Frame::Type::State;
-            frame->report = {};
-            frame->key = "Algs.ActivationThreshold";
-            frame->value = 150.0 + static_cast<double>(position % 7000) / 100.0;
+            frame.type = Frame::Type::State;
+            frame.report = {};
+            frame.key = "Algs.ActivationThreshold";
+            frame.value = 150.0 + static_cast<double>(position % 7000) / 100.0;
         }
     }
     return frames;

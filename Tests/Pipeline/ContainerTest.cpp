@@ -21,7 +21,6 @@
 namespace VexaTouch {
 namespace {
 
-using ::testing::IsEmpty;
 using namespace std::string_literals;
 using namespace Testing;
 using Bytes = std::vector<std::uint8_t>;

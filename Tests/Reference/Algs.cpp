@@ -33,7 +33,7 @@ Vexa::HidEvent digitizerEvent(std::uint32_t eventMask, PixelRegion verticalCoord
 /// The number after "VirtualNormalizationFactors.", or nothing for a key without that domain.
 std::optional<int> factorIndex(const std::string& key) {
     const std::string prefix = "VirtualNormalizationFactors.";
-    if (key.compare(0, prefix.size(), prefix) != 0) {
+    if (!key.starts_with(prefix)) {
         return std::nullopt;
     }
     std::istringstream stream(key.substr(prefix.size()));

@@ -53,10 +53,7 @@ public:
         const Vexa::DigitizerEventRecord* record = event.digitizerRecord();
         Vexa::DigitizerEventRecord expected = record_;
         expected.timestamp = event.timestamp();
-        if (record == nullptr || !(*record == expected)) {
-            return false;
-        }
-        return true;
+        return record != nullptr && *record == expected;
     }
     void DescribeTo(std::ostream* out) const {
         *out << "is " << name_;
