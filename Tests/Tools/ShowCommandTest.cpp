@@ -477,6 +477,8 @@ public:
                 pointers.push_back(const_cast<char*>(argument.c_str()));
             }
             pointers.push_back(nullptr);
+            // A test run in the background was started with interrupts ignored.
+            std::signal(SIGINT, SIG_DFL);
             execv(VEXATOUCH_PROGRAM, pointers.data());
             _exit(127);
         }
