@@ -7,6 +7,7 @@
 
 #include "Pipeline/ContainerReader.h"
 #include "Pipeline/PipelineRecording.h"
+#include "Platform/Json.h"
 #include "Tests/Support/ContainerAnswer.h"
 #include "Tests/Support/SeededRandom.h"
 
@@ -16,7 +17,9 @@
 #include <cstdlib>
 #include <iostream>
 #include <iterator>
+#include <list>
 #include <map>
+#include <optional>
 #include <random>
 #include <string>
 #include <string_view>
@@ -280,6 +283,112 @@ TEST(ContainerPropertyTest, DamagedDocumentsReadByStreamAsByTree) {
     }
     EXPECT_GT(answers["frames"], 100);
     EXPECT_GT(answers[kAllAnswers[3]], 1000);
+}
+
+/// What the system writes of a few random frames: the form that readers meet nearly always.
+std::string writtenContainer(SeededRandom& random) {
+    std::list<PipelineRecording::Frame> frames;
+    for (int i = random.between(0, 5); i > 0; --i) {
+        const std::uint64_t timestamp = random.next() >> random.between(0, 63);
+        if (random.oneIn(3)) {
+            static const Vexa::PropertyValue kValues[] = {
+                200.0, true, "text \"\n", Vexa::PropertyValue::null(),
+                Vexa::PropertyValue::Array{1, Vexa::PropertyValue::Dictionary{{"Type", "State"}}}};
+            frames.push_back(stateFrame(timestamp, random.oneIn(2) ? "Algs.Key" : "\xC3\xA9\\",
+                                        random.oneOf(kValues)));
+        } else {
+            std::vector<std::uint8_t> report(static_cast<std::size_t>(random.between(0, 80)));
+            for (std::uint8_t& byte : report) {
+                byte = static_cast<std::uint8_t>(random.next());
+            }
+            frames.push_back(reportFrame(timestamp, std::move(report)));
+        }
+    }
+    return PipelineRecording(std::move(frames)).json();
+}
+
+TEST(ContainerPropertyTest, WrittenContainersReadByStreamAsByTreeDamagedOrNot) {
+    const std::uint64_t seed = seedOfThisRun();
+    ContainerTexts texts(seed);
+    SeededRandom random(seed + 1);
+    Answers answers;
+    for (int i = 0; i < 20'000 && !HasFailure(); ++i) {
+        std::string text = writtenContainer(random);
+        for (int damages = random.between(0, 2); damages > 0; --damages) {
+            text = texts.damaged(text);
+        }
+        count(answers, sameAnswer(text, random));
+    }
+    EXPECT_GT(answers["frames"], 5000);
+    EXPECT_GT(answers[kAllAnswers[3]], 1000);
+    EXPECT_GT(answers["invalid_argument: invalid frame type"], 10);
+    EXPECT_GT(answers["invalid_argument: invalid hex string"], 10);
+}
+
+TEST(ContainerPropertyTest, AWrittenContainerReadsTheSameWhereverItIsCutInTwo) {
+    SeededRandom random(seedOfThisRun());
+    for (int i = 0; i < 30 && !HasFailure(); ++i) {
+        const std::string text = writtenContainer(random);
+        const ContainerAnswer expected = readByTree(text);
+        ASSERT_EQ(expected.fault, "");
+        for (std::size_t cut = 0; cut <= text.size(); ++cut) {
+            ContainerReader reader;
+            EXPECT_TRUE(reader.write(std::string_view(text).substr(0, cut)));
+            EXPECT_TRUE(reader.write(std::string_view(text).substr(cut)));
+            ASSERT_EQ(answerOf([&] { return reader.finish(); }), expected) << cut;
+        }
+    }
+}
+
+/// Where a reader of JSON finds the fault of a whole text, if it has one.
+std::optional<std::uint64_t> jsonErrorOffset(std::string_view text) {
+    Vexa::JsonValueBuilder builder;
+    Vexa::JsonParser parser(builder);
+    return parser.write(text) && parser.finish() ? std::nullopt
+                                                 : std::optional(parser.errorOffset());
+}
+
+TEST(ContainerPropertyTest, ASyntaxErrorIsWhereAReaderOfJsonFindsIt) {
+    const std::uint64_t seed = seedOfThisRun();
+    ContainerTexts texts(seed);
+    SeededRandom random(seed + 1);
+    for (int i = 0; i < 5'000 && !HasFailure(); ++i) {
+        const std::string text = texts.damaged(writtenContainer(random));
+        ContainerReader reader;
+        reader.write(text);
+        answerOf([&] { return reader.finish(); });
+        const std::optional<std::uint64_t> expected = jsonErrorOffset(text);
+        ASSERT_EQ(reader.errorOffset().has_value(), expected.has_value()) << text;
+        if (expected) {
+            // Within a character, escape or literal it may depend on how the text was cut.
+            constexpr double kLongestToken = 6;
+            EXPECT_NEAR(static_cast<double>(*reader.errorOffset()), static_cast<double>(*expected),
+                        kLongestToken)
+                << text;
+        }
+    }
+}
+
+TEST(ContainerPropertyTest, RecoveryKeepsEveryWholeFrameOfAWrittenContainerCutOffAnywhere) {
+    SeededRandom random(seedOfThisRun());
+    for (int i = 0; i < 30 && !HasFailure(); ++i) {
+        const std::string text = writtenContainer(random);
+        const std::list<PipelineRecording::Frame> all = readByTree(text).frames;
+        for (std::size_t length = 0; length <= text.size(); ++length) {
+            const std::string_view cut = std::string_view(text).substr(0, length);
+            // A frame ends where a bracket closes at a frame's indentation.
+            std::size_t whole = 0;
+            for (std::size_t at = 0; (at = cut.find("\n    }", at)) != std::string_view::npos;
+                 ++at) {
+                ++whole;
+            }
+            ContainerReader reader;
+            reader.write(cut);
+            const std::list<PipelineRecording::Frame> expected(
+                all.begin(), std::next(all.begin(), static_cast<std::ptrdiff_t>(whole)));
+            ASSERT_EQ(reader.recover(), expected) << cut;
+        }
+    }
 }
 
 TEST(ContainerPropertyTest, RecoveryKeepsWhatReadingAWholeTextGives) {
