@@ -1,9 +1,11 @@
 #include "Pipeline/ContainerReader.h"
 
 #include "Pipeline/ContainerFormat.h"
+#include "Pipeline/FrameScanner.h"
 #include "Platform/Json.h"
 #include "Shared/Util.h"
 
+#include <algorithm>
 #include <array>
 #include <stdexcept>
 #include <utility>
@@ -200,6 +202,7 @@ public:
     }
 
     void onString(std::string_view piece, bool last) override {
+        inString_ = !last;
         if (passOn([&](Vexa::JsonHandler& to) { to.onString(piece, last); }, 0)) {
             return;
         }
@@ -239,6 +242,21 @@ public:
         if (!passOn([](Vexa::JsonHandler& to) { to.onNull(); }, 0)) {
             refuseValue();
         }
+    }
+
+    /// True between two elements of "Frames", outside of any value.
+    [[nodiscard]] bool isBetweenFrames() const noexcept {
+        return place_ == Place::Array && array_ == &frames_ && skipDepth_ == 0 && !inString_;
+    }
+
+    /// Takes the plain frames at the front of the text; gives how many characters they were.
+    std::size_t scanFrames(std::string_view text) {
+        FrameScanner scanner(text);
+        while (scanner.scan(frames_.frames.emplace_back())) {
+            ++frames_.elements;
+        }
+        frames_.frames.pop_back();
+        return scanner.position();
     }
 
     std::list<Frame> takeFrames() {
@@ -462,6 +480,7 @@ private:
     }
 
     Place place_ = Place::Document;
+    bool inString_ = false;       // pieces of a string are still to come
     int skipDepth_ = 0;           // open arrays and objects of a value that is skipped
     bool buildingValue_ = false;  // a state frame's value goes to valueBuilder_
     bool isObject_ = false;
@@ -483,13 +502,44 @@ struct ContainerReader::State {
     Handler handler;
     Vexa::JsonParser parser{handler};
     bool malformed = false;
+    char lastCharacter = ' ';        // the last that was not white space and that the parser got
+    std::uint64_t scannedBytes = 0;  // which the parser did not get
+
+    bool parse(std::string_view piece);
 };
+
+bool ContainerReader::State::parse(std::string_view piece) {
+    const std::size_t last = piece.find_last_not_of(" \n\r\t");
+    if (last != std::string_view::npos) {
+        lastCharacter = piece[last];
+    }
+    malformed = !parser.write(piece);
+    return !malformed;
+}
 
 ContainerReader::ContainerReader() : state_(std::make_unique<State>()) {}
 ContainerReader::~ContainerReader() = default;
 
 bool ContainerReader::write(std::string_view piece) {
-    state_->malformed = state_->malformed || !state_->parser.write(piece);
+    // Behind a comma between two elements the parser can only take another element, so whole
+    // elements together with their own commas may be kept from it. It gets the rest in pieces that
+    // end where an element could begin; the more of them begin none, the longer they become.
+    constexpr std::size_t kLongestStride = std::size_t{1} << 16U;
+    std::size_t stride = 1;
+    while (!piece.empty() && !state_->malformed) {
+        if (piece.front() == '{' && state_->lastCharacter == ',' &&
+            state_->handler.isBetweenFrames()) {
+            const std::size_t scanned = state_->handler.scanFrames(piece);
+            state_->scannedBytes += scanned;
+            piece.remove_prefix(scanned);
+            stride = scanned != 0 ? 1 : stride;
+        }
+        const std::size_t next = piece.find('{', stride);
+        const std::string_view part = piece.substr(0, next);
+        state_->parse(part);
+        piece.remove_prefix(part.size());
+        stride = std::min(2 * stride, kLongestStride);
+    }
     return !state_->malformed;
 }
 
@@ -506,7 +556,8 @@ std::optional<std::uint32_t> ContainerReader::version() const noexcept {
 }
 
 std::optional<std::uint64_t> ContainerReader::errorOffset() const noexcept {
-    return state_->malformed ? std::optional(state_->parser.errorOffset()) : std::nullopt;
+    return state_->malformed ? std::optional(state_->parser.errorOffset() + state_->scannedBytes)
+                             : std::nullopt;
 }
 
 std::string ContainerReader::syntaxError() const {

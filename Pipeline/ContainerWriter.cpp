@@ -14,8 +14,17 @@ constexpr std::size_t kPieceSize = std::size_t{1} << 16U;
 
 }  // namespace
 
-ContainerWriter::ContainerWriter(Sink sink) : sink_(std::move(sink)), json_(text_) {
-    text_.reserve(kPieceSize + kPieceSize / 4);
+ContainerWriter::ContainerWriter(Sink sink)
+    : sink_(std::move(sink)), text_(pending_), json_(text_) {
+    pending_.reserve(kPieceSize + kPieceSize / 4);
+    begin();
+}
+
+ContainerWriter::ContainerWriter(std::string& out) : text_(out), json_(text_) {
+    begin();
+}
+
+void ContainerWriter::begin() {
     json_.beginObject();
     json_.key(Container::Version);
     json_.number(std::uint64_t{Container::kVersion});
@@ -43,12 +52,11 @@ void ContainerWriter::write(const PipelineRecording::Frame& frame) {
         }
     } else {
         json_.key(Container::Report);
-        hex_.clear();
-        Util::appendHexString(hex_, frame.report);
-        json_.plainString(hex_);
+        Util::appendHexString(json_.beginPlainString(), frame.report);
+        json_.endPlainString();
     }
     json_.endObject();
-    if (text_.size() >= kPieceSize) {
+    if (pending_.size() >= kPieceSize) {
         flush();
     }
 }
@@ -61,8 +69,10 @@ void ContainerWriter::finish() {
 }
 
 void ContainerWriter::flush() {
-    sink_(text_);
-    text_.clear();
+    if (sink_) {
+        sink_(pending_);
+        pending_.clear();
+    }
 }
 
 }  // namespace VexaTouch

@@ -17,6 +17,10 @@ public:
     using Sink = std::function<void(std::string_view piece)>;
 
     explicit ContainerWriter(Sink sink);
+    /// Appends the whole document to `out`, which must outlive the writer.
+    explicit ContainerWriter(std::string& out);
+    ContainerWriter(const ContainerWriter&) = delete;
+    ContainerWriter& operator=(const ContainerWriter&) = delete;
 
     /// Appends one frame; a frame of an unknown type is skipped.
     void write(const PipelineRecording::Frame& frame);
@@ -24,11 +28,12 @@ public:
     void finish();
 
 private:
+    void begin();
     void flush();
 
-    Sink sink_;
-    std::string text_;
-    std::string hex_;  // one report's text, kept for its memory
+    Sink sink_;            // empty when the text goes to the caller's string
+    std::string pending_;  // what the sink gets next
+    std::string& text_;
     Vexa::JsonWriter json_;
 };
 

@@ -253,11 +253,19 @@ void JsonWriter::string(std::string_view text) {
     quoted(text);
 }
 
-void JsonWriter::plainString(std::string_view text) {
+std::string& JsonWriter::beginPlainString() {
     beforeValue();
     out_ += '"';
-    out_ += text;
+    return out_;
+}
+
+void JsonWriter::endPlainString() {
     out_ += '"';
+}
+
+void JsonWriter::plainString(std::string_view text) {
+    beginPlainString() += text;
+    endPlainString();
 }
 
 void JsonWriter::boolean(bool value) {

@@ -38,6 +38,10 @@ public:
     void number(std::int64_t value);
     void number(std::uint64_t value);
     void number(double value);
+    /// Opens a string whose text is appended to the returned output by hand, without escaping, and
+    /// closed by endPlainString. Saves long texts a copy.
+    std::string& beginPlainString();
+    void endPlainString();
     /// Text that is known to need no escaping (for instance hexadecimal digits), quoted as it is.
     void plainString(std::string_view text);
 

@@ -6,8 +6,8 @@
 #include <array>
 #include <cstddef>
 #include <cstdio>
-#include <cstring>
 #include <cstdlib>
+#include <cstring>
 #include <stdexcept>
 
 namespace VexaTouch::Util {
@@ -244,19 +244,25 @@ std::vector<std::uint8_t> bytesFromHexString(std::string_view text) {
     return bytes;
 }
 
+std::size_t readPlainHexBytes(std::string_view text, std::span<std::uint8_t> bytes) noexcept {
+    HexNumberReader reader(text);
+    constexpr std::size_t kMany = 8;
+    std::size_t count = 0;
+    while (bytes.size() - count >= kMany && reader.readPlainBytes<kMany>(&bytes[count])) {
+        count += kMany;
+    }
+    while (bytes.size() != count && reader.readPlainBytes<1>(&bytes[count])) {
+        ++count;
+    }
+    return count;
+}
+
 void readHexString(std::string_view text, std::vector<std::uint8_t>& bytes) {
     // The usual text has three characters a byte; a text of single digits needs the list to grow.
     bytes.resize(text.size() / kHexTextLength);
-    HexNumberReader reader(text);
-    std::size_t count = 0;
-    constexpr std::size_t kMany = 8;
-    while (reader.readPlainBytes<kMany>(bytes.data() + count)) {
-        count += kMany;
-    }
-    while (reader.readPlainBytes<1>(bytes.data() + count)) {
-        ++count;
-    }
-    bytes.resize(count);
+    const std::size_t plain = readPlainHexBytes(text, bytes);
+    bytes.resize(plain);
+    HexNumberReader reader(text.substr(plain * kHexTextLength));
     std::uint16_t value = 0;
     while (reader.read(value)) {
         if (value > 0xFF) {

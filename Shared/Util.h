@@ -2,6 +2,7 @@
 
 #include "Shared/InputReport.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <span>
 #include <string>
@@ -32,6 +33,10 @@ void appendHexString(std::string& text, std::span<const std::uint8_t> bytes);
 std::vector<std::uint8_t> bytesFromHexString(std::string_view text);
 /// The same into `bytes`, whose content is replaced (and unspecified after a throw).
 void readHexString(std::string_view text, std::vector<std::uint8_t>& bytes);
+
+/// Reads bytes from the front of a text as long as they have the form that hexStringFromBytes
+/// writes (digits of either case) and there is room; gives their number.
+std::size_t readPlainHexBytes(std::string_view text, std::span<std::uint8_t> bytes) noexcept;
 
 /// If `key` begins with `domain` and a dot (compared up to a zero byte), removes both and returns
 /// true; otherwise leaves the key alone and returns false.
