@@ -19,6 +19,7 @@ public:
     explicit ContainerWriter(Sink sink);
     /// Appends the whole document to `out`, which must outlive the writer.
     explicit ContainerWriter(std::string& out);
+    ~ContainerWriter() = default;
     ContainerWriter(const ContainerWriter&) = delete;
     ContainerWriter& operator=(const ContainerWriter&) = delete;
 
