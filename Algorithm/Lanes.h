@@ -1,25 +1,18 @@
 #pragma once
 
 #include <array>
-#include <bit>
-#include <cstdint>
 
 namespace VexaTouch {
 
 /// Four numbers side by side. Every operation is the scalar one on each lane, rounded as the scalar
 /// one is, so results do not depend on the machine's instructions.
 using FloatLanes [[gnu::vector_size(16)]] = float;
-using IntegerLanes [[gnu::vector_size(16)]] = std::int32_t;
 
 // A call costs more than a step on four numbers, and vectors cross calls through memory.
 #define VEXA_LANES_INLINE [[gnu::always_inline]] inline
 
 VEXA_LANES_INLINE FloatLanes allLanes(float value) noexcept {
     return FloatLanes{value, value, value, value};
-}
-
-VEXA_LANES_INLINE IntegerLanes allLanes(std::int32_t value) noexcept {
-    return IntegerLanes{value, value, value, value};
 }
 
 /// See the scalar operations of the same names.
