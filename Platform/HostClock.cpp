@@ -1,5 +1,6 @@
 #include "Platform/HostClock.h"
 
+#include <vexa/clock.h>
 #include <algorithm>
 #include <chrono>
 #include <thread>
@@ -10,11 +11,8 @@ namespace {
 
 class SteadyHostClock final : public HostClock {
 public:
-    std::uint64_t now() override {
-        const auto sinceStart = std::chrono::steady_clock::now().time_since_epoch();
-        return static_cast<std::uint64_t>(
-            std::chrono::duration_cast<std::chrono::nanoseconds>(sinceStart).count());
-    }
+    // The library's, whose time stamps of reports must be of the same clock.
+    std::uint64_t now() override { return vexa_clock_now(); }
 
     void sleepMicroseconds(std::uint64_t microseconds) override {
         // Whole days one after another: a longer duration would overflow on its way to the kernel.

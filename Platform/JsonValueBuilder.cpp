@@ -1,8 +1,11 @@
 #include "Platform/JsonValueBuilder.h"
 
+#include <vexa/value.h>
+#include <cstddef>
+#include <new>
+#include <span>
 #include <string>
 #include <utility>
-#include <variant>
 #include <vector>
 
 namespace Vexa {
@@ -20,34 +23,44 @@ PropertyValue JsonNumber::toPropertyValue() const {
 }
 
 struct JsonValueBuilder::State {
-    struct OpenObject {
-        PropertyValue::Dictionary members;
-        std::string key;  // of the member whose value comes next
+    struct Key {
+        std::size_t begin;
+        std::size_t length;
     };
-    using Container = std::variant<PropertyValue::Array, OpenObject>;
+    struct Container {
+        std::size_t firstValue;
+        std::size_t firstKey;
+        std::size_t firstKeyText;
+    };
 
+    // Each holds what belongs to the open containers, the innermost one last.
     std::vector<Container> open;
-    std::string text;  // the pieces of a key or string so far
-    PropertyValue root;
+    std::vector<PropertyValue> values;  // the root, once it is complete
+    std::vector<Key> keys;              // of objects only, one for each value but the next
+    std::string keyTexts;
 
-    void add(PropertyValue value) {
-        if (open.empty()) {
-            root = std::move(value);
-        } else if (auto* array = std::get_if<PropertyValue::Array>(&open.back())) {
-            array->push_back(std::move(value));
-        } else {
-            auto& object = std::get<OpenObject>(open.back());
-            // Texts that we wrote come in order, so that the end is where most members belong.
-            object.members.insert_or_assign(object.members.end(), std::move(object.key),
-                                            std::move(value));
-        }
+    std::size_t keyBegin = 0;  // of the key whose pieces come in
+    std::string text;          // the pieces of a string so far
+    std::vector<vexa_member> members;
+
+    void add(PropertyValue value) { values.push_back(std::move(value)); }
+
+    void begin() { open.push_back({values.size(), keys.size(), keyTexts.size()}); }
+
+    /// The values of the innermost container.
+    [[nodiscard]] std::span<PropertyValue> innermost() {
+        return std::span(values).subspan(open.back().firstValue);
     }
 
-    /// The whole text once its last piece is there.
-    std::string join(std::string_view lastPiece) {
-        if (text.empty()) return std::string(lastPiece);
-        text += lastPiece;
-        return std::exchange(text, {});
+    /// The container takes the place of what it contains.
+    void end(PropertyValue container) {
+        const Container& ended = open.back();
+        values.resize(ended.firstValue);
+        keys.resize(ended.firstKey);
+        keyTexts.resize(ended.firstKeyText);
+        keyBegin = keyTexts.size();
+        open.pop_back();
+        add(std::move(container));
     }
 };
 
@@ -55,41 +68,42 @@ JsonValueBuilder::JsonValueBuilder() : state_(std::make_unique<State>()) {}
 JsonValueBuilder::~JsonValueBuilder() = default;
 
 void JsonValueBuilder::onObjectBegin() {
-    state_->open.emplace_back(State::OpenObject());
+    state_->begin();
 }
 
 void JsonValueBuilder::onObjectEnd() {
-    PropertyValue value(std::move(std::get<State::OpenObject>(state_->open.back()).members));
-    state_->open.pop_back();
-    state_->add(std::move(value));
+    std::vector<vexa_member>& members = state_->members;
+    members.clear();
+    const State::Key* key = state_->keys.data() + state_->open.back().firstKey;
+    for (const PropertyValue& value : state_->innermost()) {
+        members.push_back({state_->keyTexts.data() + key->begin, key->length, value.handle()});
+        ++key;
+    }
+    PropertyValue object =
+        PropertyValue::adopt(vexa_value_create_dictionary_of(members.data(), members.size()));
+    if (!object) throw std::bad_alloc();
+    state_->end(std::move(object));
 }
 
 void JsonValueBuilder::onArrayBegin() {
-    state_->open.emplace_back(PropertyValue::Array());
+    state_->begin();
 }
 
 void JsonValueBuilder::onArrayEnd() {
-    auto& elements = std::get<PropertyValue::Array>(state_->open.back());
-    elements.shrink_to_fit();
-    PropertyValue value(std::move(elements));
-    state_->open.pop_back();
-    state_->add(std::move(value));
+    state_->end(PropertyValue::arrayOf(state_->innermost()));
 }
 
 void JsonValueBuilder::onKey(std::string_view piece, bool last) {
-    if (last) {
-        std::get<State::OpenObject>(state_->open.back()).key = state_->join(piece);
-    } else {
-        state_->text += piece;
-    }
+    state_->keyTexts += piece;
+    if (!last) return;
+    state_->keys.push_back({state_->keyBegin, state_->keyTexts.size() - state_->keyBegin});
+    state_->keyBegin = state_->keyTexts.size();
 }
 
 void JsonValueBuilder::onString(std::string_view piece, bool last) {
-    if (last) {
-        state_->add(state_->join(piece));
-    } else {
-        state_->text += piece;
-    }
+    if (last && state_->text.empty()) return state_->add(piece);
+    state_->text += piece;
+    if (last) state_->add(std::exchange(state_->text, {}));
 }
 
 void JsonValueBuilder::onNumber(const JsonNumber& number) {
@@ -105,12 +119,12 @@ void JsonValueBuilder::onNull() {
 }
 
 bool JsonValueBuilder::isComplete() const noexcept {
-    return state_->open.empty() && state_->root;
+    return state_->open.empty() && !state_->values.empty();
 }
 
 PropertyValue JsonValueBuilder::take() {
     PropertyValue value;
-    if (isComplete()) value = std::move(state_->root);
+    if (isComplete()) value = std::move(state_->values.back());
     *state_ = State();
     return value;
 }

@@ -3,11 +3,13 @@
 #include "Platform/PropertyWalk.h"
 #include "Platform/ShortestText.h"
 
+#include <vexa/value.h>
 #include <array>
 #include <charconv>
 #include <cmath>
 #include <cstddef>
 #include <cstring>
+#include <span>
 
 namespace Vexa {
 
@@ -114,7 +116,7 @@ void appendEscaped(std::string& out, char character) {
     out += kHexDigits[code & 15];
 }
 
-std::string hexadecimalText(const PropertyValue::Bytes& bytes) {
+std::string hexadecimalText(std::span<const std::uint8_t> bytes) {
     std::string text;
     text.reserve(bytes.size() * 3);
     for (const std::uint8_t byte : bytes) {
@@ -141,24 +143,29 @@ public:
     void endArray() { writer_.endArray(); }
     void beginDictionary(std::size_t /*count*/) { writer_.beginObject(); }
     void endDictionary() { writer_.endObject(); }
-    void key(const std::string& name) { writer_.key(name); }
+    void key(std::string_view name) { writer_.key(name); }
 
-    void leaf(const PropertyValue& value) {
-        using Type = PropertyValue::Type;
-        switch (value.type()) {
-            case Type::Boolean:
-                return writer_.boolean(value.toBoolean());
-            case Type::Signed:
-                return writer_.number(*value.asSigned());
-            case Type::Unsigned:
-                return writer_.number(*value.asUnsigned());
-            case Type::Float:
-            case Type::Double:
-                return writer_.number(value.toDouble());
-            case Type::String:
-                return writer_.string(*value.asString());
-            case Type::Bytes:
-                return writer_.plainString(hexadecimalText(*value.asBytes()));
+    void leaf(const vexa_value* value, vexa_value_type type) {
+        switch (type) {
+            case VEXA_VALUE_BOOLEAN:
+                return writer_.boolean(vexa_value_to_boolean(value));
+            case VEXA_VALUE_SIGNED:
+                return writer_.number(static_cast<std::int64_t>(vexa_value_to_unsigned(value)));
+            case VEXA_VALUE_UNSIGNED:
+                return writer_.number(vexa_value_to_unsigned(value));
+            case VEXA_VALUE_FLOAT:
+            case VEXA_VALUE_DOUBLE:
+                return writer_.number(vexa_value_to_double(value));
+            case VEXA_VALUE_STRING: {
+                std::size_t length = 0;
+                const char* text = vexa_value_get_string(value, &length);
+                return writer_.string({text, length});
+            }
+            case VEXA_VALUE_BYTES: {
+                std::size_t length = 0;
+                const std::uint8_t* bytes = vexa_value_get_bytes(value, &length);
+                return writer_.plainString(hexadecimalText({bytes, length}));
+            }
             default:
                 return writer_.null();
         }
@@ -296,7 +303,7 @@ void JsonWriter::number(double value) {
 
 void JsonWriter::value(const PropertyValue& value) {
     ValueWriter visitor(*this);
-    Detail::PropertyWalk(visitor).walk(value);
+    Detail::PropertyWalk(visitor).walk(value.handle());
 }
 
 }  // namespace Vexa

@@ -1,131 +1,95 @@
 #include "Platform/Log.h"
 
 #include <algorithm>
-#include <array>
-#include <atomic>
-#include <cstddef>
-#include <cstdio>
 #include <memory>
-#include <mutex>
-#include <string>
 #include <utility>
 
 namespace Vexa {
 
 namespace {
 
-constexpr std::array<std::string_view, kLogCategoryCount> kCategoryNames = {
-    "HIDService", "Pipeline", "Recording", "Algs"};
-constexpr std::array<std::string_view, 4> kLevelNames = {"debug", "info", "error", "off"};
+constexpr int kLogLevelCount = 4;
 
-constinit std::array<std::atomic<LogLevel>, kLogCategoryCount> levels = {
-    LogLevel::Error, LogLevel::Error, LogLevel::Error, LogLevel::Error};
+vexa_log_category coded(LogCategory category) {
+    return static_cast<vexa_log_category>(category);
+}
 
-template <std::size_t kCount>
-std::string_view nameAt(const std::array<std::string_view, kCount>& names, std::size_t index) {
-    return index < names.size() ? names[index] : std::string_view("?");
+vexa_log_level coded(LogLevel level) {
+    return static_cast<vexa_log_level>(level);
 }
 
 char lowered(char letter) {
     return letter >= 'A' && letter <= 'Z' ? static_cast<char>(letter - 'A' + 'a') : letter;
 }
 
-void writeToStandardError(LogCategory category, LogLevel level, std::string_view message) {
-    std::string line;
-    line.append(logCategoryName(category)).append(" ").append(logLevelName(level)).append(": ");
-    line.append(message).append("\n");
-    // One call, so that lines of several processes do not mix on a terminal.
-    std::fwrite(line.data(), 1, line.size(), stderr);
-}
-
-struct SinkState {
-    // Recursive, so that a sink may log (the message is lost) or replace itself.
-    std::recursive_mutex mutex;
-    std::shared_ptr<const LogSink> sink;
-    bool isCalling = false;
-};
-
-/// Marks the sink as being called, for as long as this object lives.
-class CallMark {
-public:
-    explicit CallMark(SinkState& state) : state_(state) { state_.isCalling = true; }
-    ~CallMark() { state_.isCalling = false; }
-    CallMark(const CallMark&) = delete;
-    CallMark(CallMark&&) = delete;
-    CallMark& operator=(const CallMark&) = delete;
-    CallMark& operator=(CallMark&&) = delete;
-
-private:
-    SinkState& state_;
-};
-
-SinkState& sinkState() {
-    // Never destroyed: detached threads may log until the process ends.
-    static SinkState& state = *std::make_unique<SinkState>().release();
-    return state;
-}
-
-}  // namespace
-
-std::string_view logCategoryName(LogCategory category) noexcept {
-    return nameAt(kCategoryNames, static_cast<std::size_t>(category));
-}
-
-std::string_view logLevelName(LogLevel level) noexcept {
-    return nameAt(kLevelNames, static_cast<std::size_t>(level));
-}
-
-std::optional<LogCategory> logCategoryFromName(std::string_view name) noexcept {
-    const auto found = std::find(kCategoryNames.begin(), kCategoryNames.end(), name);
-    if (found == kCategoryNames.end()) return std::nullopt;
-    return static_cast<LogCategory>(found - kCategoryNames.begin());
-}
-
-std::optional<LogLevel> logLevelFromName(std::string_view name) noexcept {
-    const auto isName = [name](std::string_view candidate) {
-        return std::equal(candidate.begin(), candidate.end(), name.begin(), name.end(),
-                          [](char a, char b) { return a == lowered(b); });
-    };
-    const auto found = std::find_if(kLevelNames.begin(), kLevelNames.end(), isName);
-    if (found == kLevelNames.end()) return std::nullopt;
-    return static_cast<LogLevel>(found - kLevelNames.begin());
-}
-
-bool Log::isEnabled(LogLevel level) const noexcept {
-    // Off is a threshold only: nothing is logged at it.
-    return level < LogLevel::Off &&
-           level >= levels[static_cast<std::size_t>(category_)].load(std::memory_order_relaxed);
-}
-
-void Log::write(LogLevel level, std::string_view message) const noexcept {
-    if (!isEnabled(level)) return;
+void callSink(void* context, vexa_log_category category, vexa_log_level level, const char* message,
+              size_t length) noexcept {
     try {
-        SinkState& state = sinkState();
-        const std::lock_guard lock(state.mutex);
-        if (state.isCalling) return;
-        const CallMark mark(state);
-        // A copy keeps the sink alive when it replaces itself.
-        const std::shared_ptr<const LogSink> sink = state.sink;
-        if (sink) {
-            (*sink)(category_, level, message);
-        } else {
-            writeToStandardError(category_, level, message);
-        }
+        const LogSink& sink = *static_cast<const LogSink*>(context);
+        sink(static_cast<LogCategory>(category), static_cast<LogLevel>(level),
+             std::string_view(message, length));
     } catch (...) {
         return;  // the message is lost, the caller is not disturbed
     }
 }
 
+void destroySink(void* context) noexcept {
+    const std::unique_ptr<LogSink> owned(static_cast<LogSink*>(context));
+}
+
+}  // namespace
+
+std::string_view logCategoryName(LogCategory category) noexcept {
+    return vexa_log_category_name(coded(category));
+}
+
+std::string_view logLevelName(LogLevel level) noexcept {
+    return vexa_log_level_name(coded(level));
+}
+
+std::optional<LogCategory> logCategoryFromName(std::string_view name) noexcept {
+    for (int i = 0; i < kLogCategoryCount; ++i) {
+        const auto category = static_cast<LogCategory>(i);
+        if (name == logCategoryName(category)) return category;
+    }
+    return std::nullopt;
+}
+
+std::optional<LogLevel> logLevelFromName(std::string_view name) noexcept {
+    for (int i = 0; i < kLogLevelCount; ++i) {
+        const auto level = static_cast<LogLevel>(i);
+        const std::string_view candidate = logLevelName(level);
+        if (std::equal(candidate.begin(), candidate.end(), name.begin(), name.end(),
+                       [](char a, char b) { return a == lowered(b); })) {
+            return level;
+        }
+    }
+    return std::nullopt;
+}
+
+void Log::write(LogLevel level, std::string_view message) const noexcept {
+    vexa_log_write(coded(category_), coded(level), message.data(), message.size());
+}
+
 void Log::setLevel(LogCategory category, LogLevel level) noexcept {
-    levels[static_cast<std::size_t>(category)].store(level, std::memory_order_relaxed);
+    vexa_log_set_level(coded(category), coded(level));
+}
+
+LogLevel Log::level(LogCategory category) noexcept {
+    return static_cast<LogLevel>(vexa_log_get_level(coded(category)));
 }
 
 void Log::setSink(LogSink sink) {
-    std::shared_ptr<const LogSink> next;
-    if (sink) next = std::make_shared<const LogSink>(std::move(sink));
-    SinkState& state = sinkState();
-    const std::lock_guard lock(state.mutex);
-    state.sink.swap(next);
+    if (!sink) {
+        vexa_log_set_sink(nullptr, nullptr, nullptr);
+        return;
+    }
+    auto owned = std::make_unique<LogSink>(std::move(sink));
+    vexa_log_set_sink(&callSink, owned.release(), &destroySink);
+}
+
+void Log::flush() noexcept {
+    vexa_log_flush();
 }
 
 }  // namespace Vexa

@@ -1,9 +1,17 @@
 #pragma once
 
+#include "Platform/Handle.h"
+#include "Platform/OptionalView.h"
+
+#include <vexa/value.h>
+#include <compare>
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
+#include <iterator>
 #include <map>
+#include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -11,13 +19,10 @@
 
 namespace Vexa {
 
-namespace Detail {
-struct PropertyNode;
-}
-
-/// A dynamically typed value: a handle the size of a pointer to an immutable node.
+/// A dynamically typed value: a counted reference, the size of a pointer, to an immutable object of
+/// libvexaplatform.
 ///
-/// Copying shares the node (one atomic increment); nothing below a handle ever changes, so values
+/// Copying shares the object (one atomic increment); nothing below a handle ever changes, so values
 /// may be read and copied on any thread, and released on any thread. Assigning to one handle from
 /// two threads at once needs a lock, as with any object.
 ///
@@ -26,30 +31,30 @@ struct PropertyNode;
 class PropertyValue {
 public:
     enum class Type : std::uint8_t {
-        None,  ///< no value at all
-        Null,  ///< the value null
-        Boolean,
-        Signed,    ///< 64-bit signed integer
-        Unsigned,  ///< 64-bit unsigned integer
-        Float,     ///< single-precision number, kept exactly
-        Double,
-        String,  ///< bytes, by convention UTF-8
-        Bytes,
-        Array,
-        Dictionary,
+        None = VEXA_VALUE_NONE,  ///< no value at all
+        Null = VEXA_VALUE_NULL,  ///< the value null
+        Boolean = VEXA_VALUE_BOOLEAN,
+        Signed = VEXA_VALUE_SIGNED,      ///< 64-bit signed integer
+        Unsigned = VEXA_VALUE_UNSIGNED,  ///< 64-bit unsigned integer
+        Float = VEXA_VALUE_FLOAT,        ///< single-precision number, kept exactly
+        Double = VEXA_VALUE_DOUBLE,
+        String = VEXA_VALUE_STRING,  ///< bytes, by convention UTF-8
+        Bytes = VEXA_VALUE_BYTES,
+        Array = VEXA_VALUE_ARRAY,
+        Dictionary = VEXA_VALUE_DICTIONARY,
     };
 
+    // What containers are made from.
     using Bytes = std::vector<std::uint8_t>;
     using Array = std::vector<PropertyValue>;
     using Dictionary = std::map<std::string, PropertyValue, std::less<>>;
 
+    // How they are read.
+    class ArrayView;
+    class DictionaryView;
+
     /// No value.
     PropertyValue() noexcept = default;
-    PropertyValue(const PropertyValue& other) noexcept;
-    PropertyValue(PropertyValue&& other) noexcept : node_(std::exchange(other.node_, nullptr)) {}
-    PropertyValue& operator=(const PropertyValue& other) noexcept;
-    PropertyValue& operator=(PropertyValue&& other) noexcept;
-    ~PropertyValue();
 
     /// The value null (shared, never allocates).
     static PropertyValue null() noexcept;
@@ -67,15 +72,42 @@ public:
     PropertyValue(double value);
     PropertyValue(const char* text);
     PropertyValue(std::string_view text);
-    PropertyValue(std::string text);
-    PropertyValue(Bytes bytes);
-    PropertyValue(Array elements);
-    PropertyValue(Dictionary members);
+    PropertyValue(const std::string& text);
+    PropertyValue(const Bytes& bytes);
+    PropertyValue(const Array& elements);
+    PropertyValue(Array&& elements);
+    PropertyValue(const Dictionary& members);
     // NOLINTEND(google-explicit-constructor)
 
-    [[nodiscard]] Type type() const noexcept;
+    /// An array that takes the elements; they have no value afterwards. May throw std::bad_alloc.
+    static PropertyValue arrayOf(std::span<PropertyValue> elements);
+
+    // For those who speak the C interface.
+
+    /// Takes over a reference that the caller owns; NULL gives no value.
+    static PropertyValue adopt(const vexa_value* owned) noexcept {
+        PropertyValue value;
+        value.handle_ = Handle::adopt(owned);
+        return value;
+    }
+    /// Takes a reference of its own; NULL gives no value.
+    static PropertyValue share(const vexa_value* borrowed) noexcept {
+        PropertyValue value;
+        value.handle_ = Handle::share(borrowed);
+        return value;
+    }
+    /// Borrowed, as long as this handle keeps the value; NULL when there is none.
+    [[nodiscard]] const vexa_value* handle() const noexcept { return handle_.get(); }
+    /// Gives the reference to the caller and has no value afterwards.
+    [[nodiscard]] vexa_value* detach() noexcept {
+        return const_cast<vexa_value*>(handle_.detach());  // no value is made const
+    }
+
+    [[nodiscard]] Type type() const noexcept {
+        return static_cast<Type>(vexa_value_get_type(handle()));
+    }
     /// True unless this handle holds no value; null is a value.
-    [[nodiscard]] explicit operator bool() const noexcept { return node_ != nullptr; }
+    [[nodiscard]] explicit operator bool() const noexcept { return static_cast<bool>(handle_); }
     /// Signed, unsigned, float or double. A boolean is none of them (see the readings below).
     [[nodiscard]] bool isNumber() const noexcept;
 
@@ -83,25 +115,29 @@ public:
     // reads as the number 0. None of them throws.
 
     /// True for any number other than 0 (not-a-number included).
-    [[nodiscard]] bool toBoolean() const noexcept;
+    [[nodiscard]] bool toBoolean() const noexcept { return vexa_value_to_boolean(handle()); }
     /// Floating-point values are truncated toward zero, negative values go through signed 64-bit
     /// two's complement, what is out of range saturates, not-a-number is 0.
-    [[nodiscard]] std::uint64_t toUnsigned64() const noexcept;
+    [[nodiscard]] std::uint64_t toUnsigned64() const noexcept {
+        return vexa_value_to_unsigned(handle());
+    }
     /// Rounded once to nearest; overflow gives infinity.
-    [[nodiscard]] float toFloat() const noexcept;
-    [[nodiscard]] double toDouble() const noexcept;
+    [[nodiscard]] float toFloat() const noexcept { return vexa_value_to_float(handle()); }
+    [[nodiscard]] double toDouble() const noexcept { return vexa_value_to_double(handle()); }
 
-    // Views of the content, null when the value is of another type. They live as long as any
+    // Views of the content, none when the value is of another type. They live as long as any
     // handle to this value.
-    [[nodiscard]] const std::string* asString() const noexcept;
-    [[nodiscard]] const Bytes* asBytes() const noexcept;
-    [[nodiscard]] const Array* asArray() const noexcept;
-    [[nodiscard]] const Dictionary* asDictionary() const noexcept;
+
+    /// With a zero byte behind it.
+    [[nodiscard]] OptionalView<std::string_view> asString() const noexcept;
+    [[nodiscard]] OptionalView<std::span<const std::uint8_t>> asBytes() const noexcept;
+    [[nodiscard]] OptionalView<ArrayView> asArray() const noexcept;
+    [[nodiscard]] OptionalView<DictionaryView> asDictionary() const noexcept;
 
     /// The exact content of an integer value: asSigned for Type::Signed, asUnsigned for
-    /// Type::Unsigned, null for every other type.
-    [[nodiscard]] const std::int64_t* asSigned() const noexcept;
-    [[nodiscard]] const std::uint64_t* asUnsigned() const noexcept;
+    /// Type::Unsigned, none for every other type.
+    [[nodiscard]] std::optional<std::int64_t> asSigned() const noexcept;
+    [[nodiscard]] std::optional<std::uint64_t> asUnsigned() const noexcept;
 
     /// The member of a dictionary, or no value (also when this is no dictionary).
     [[nodiscard]] PropertyValue member(std::string_view key) const noexcept;
@@ -110,23 +146,173 @@ public:
     /// and double by their exact bits as doubles (so 0.0 differs from -0.0), every not-a-number
     /// equals every other; an integer never equals a floating-point value, a boolean or null
     /// never equals a number. Deep values are compared member by member.
-    friend bool operator==(const PropertyValue& a, const PropertyValue& b) noexcept;
+    friend bool operator==(const PropertyValue& a, const PropertyValue& b) noexcept {
+        return vexa_value_equal(a.handle(), b.handle());
+    }
 
     /// A readable text, for logs and diagnostics: strings in quotes, bytes as <hex>, floating-point
     /// numbers in the shortest form that reads back and always with a point, exponent or name.
     [[nodiscard]] std::string description() const;
 
 private:
-    friend struct Detail::PropertyNode;
+    using Handle = Vexa::Handle<const vexa_value, vexa_value_retain, vexa_value_release>;
 
-    explicit PropertyValue(Detail::PropertyNode* adopted) noexcept : node_(adopted) {}
-    static PropertyValue fromBoolean(bool value);
+    static PropertyValue fromBoolean(bool value) noexcept;
     static PropertyValue fromSigned(std::int64_t value);
     static PropertyValue fromUnsigned(std::uint64_t value);
 
-    Detail::PropertyNode* node_ = nullptr;
+    Handle handle_;
 };
 
 static_assert(sizeof(PropertyValue) == sizeof(void*));
+
+namespace Detail {
+
+/// Goes through a view by index. Yields values, not references.
+template <class View>
+class PropertyIterator {
+public:
+    using iterator_concept = std::random_access_iterator_tag;
+    using iterator_category = std::input_iterator_tag;
+    using value_type = typename View::value_type;
+    using reference = value_type;
+    using difference_type = std::ptrdiff_t;
+    /// Keeps what operator-> shows for as long as the expression.
+    class pointer {
+    public:
+        explicit pointer(value_type value) noexcept : value_(std::move(value)) {}
+        const value_type* operator->() const noexcept { return &value_; }
+
+    private:
+        value_type value_;
+    };
+
+    PropertyIterator() noexcept = default;
+    PropertyIterator(View view, std::size_t index) noexcept : view_(view), index_(index) {}
+
+    reference operator*() const noexcept { return view_.item(index_); }
+    pointer operator->() const noexcept { return pointer(**this); }
+    reference operator[](difference_type offset) const noexcept { return *(*this + offset); }
+
+    PropertyIterator& operator+=(difference_type offset) noexcept {
+        index_ += static_cast<std::size_t>(offset);
+        return *this;
+    }
+    PropertyIterator& operator-=(difference_type offset) noexcept { return *this += -offset; }
+    PropertyIterator& operator++() noexcept { return *this += 1; }
+    PropertyIterator& operator--() noexcept { return *this -= 1; }
+    PropertyIterator operator++(int) noexcept { return std::exchange(*this, *this + 1); }
+    PropertyIterator operator--(int) noexcept { return std::exchange(*this, *this - 1); }
+    friend PropertyIterator operator+(PropertyIterator it, difference_type offset) noexcept {
+        return it += offset;
+    }
+    friend PropertyIterator operator+(difference_type offset, PropertyIterator it) noexcept {
+        return it += offset;
+    }
+    friend PropertyIterator operator-(PropertyIterator it, difference_type offset) noexcept {
+        return it -= offset;
+    }
+    friend difference_type operator-(const PropertyIterator& a,
+                                     const PropertyIterator& b) noexcept {
+        return static_cast<difference_type>(a.index_) - static_cast<difference_type>(b.index_);
+    }
+    /// Of two of one view.
+    friend bool operator==(const PropertyIterator& a, const PropertyIterator& b) noexcept {
+        return a.index_ == b.index_;
+    }
+    friend auto operator<=>(const PropertyIterator& a, const PropertyIterator& b) noexcept {
+        return a.index_ <=> b.index_;
+    }
+
+private:
+    View view_;
+    std::size_t index_ = 0;
+};
+
+}  // namespace Detail
+
+/// The elements of an array, which lives as long as any handle to its value.
+class PropertyValue::ArrayView {
+public:
+    using value_type = PropertyValue;
+    using size_type = std::size_t;
+    using difference_type = std::ptrdiff_t;
+    using reference = PropertyValue;
+    using const_reference = PropertyValue;
+    using const_iterator = Detail::PropertyIterator<ArrayView>;
+    using iterator = const_iterator;
+
+    ArrayView() noexcept = default;
+
+    [[nodiscard]] std::size_t size() const noexcept { return vexa_value_get_count(array_); }
+    [[nodiscard]] bool empty() const noexcept { return size() == 0; }
+    /// No value beyond the end.
+    [[nodiscard]] PropertyValue operator[](std::size_t index) const noexcept { return item(index); }
+    /// Throws std::out_of_range beyond the end.
+    [[nodiscard]] PropertyValue at(std::size_t index) const;
+    [[nodiscard]] PropertyValue front() const noexcept { return item(0); }
+    [[nodiscard]] PropertyValue back() const noexcept { return item(size() - 1); }
+    [[nodiscard]] const_iterator begin() const noexcept { return {*this, 0}; }
+    [[nodiscard]] const_iterator end() const noexcept { return {*this, size()}; }
+
+    /// Element by element.
+    friend bool operator==(const ArrayView& a, const ArrayView& b) noexcept {
+        return vexa_value_equal(a.array_, b.array_);
+    }
+    friend bool operator==(const ArrayView& a, const Array& b) noexcept;
+
+private:
+    friend class PropertyValue;
+    friend const_iterator;
+
+    explicit ArrayView(const vexa_value* array) noexcept : array_(array) {}
+    [[nodiscard]] PropertyValue item(std::size_t index) const noexcept {
+        return share(vexa_value_get_element(array_, index));
+    }
+
+    const vexa_value* array_ = nullptr;
+};
+
+/// The members of a dictionary in the order of keys, which live as long as any handle to its value.
+/// Texts of keys live as long, too, and have a zero byte behind them.
+class PropertyValue::DictionaryView {
+public:
+    using key_type = std::string_view;
+    using mapped_type = PropertyValue;
+    using value_type = std::pair<std::string_view, PropertyValue>;
+    using size_type = std::size_t;
+    using difference_type = std::ptrdiff_t;
+    using reference = value_type;
+    using const_reference = value_type;
+    using const_iterator = Detail::PropertyIterator<DictionaryView>;
+    using iterator = const_iterator;
+
+    DictionaryView() noexcept = default;
+
+    [[nodiscard]] std::size_t size() const noexcept { return vexa_value_get_count(dictionary_); }
+    [[nodiscard]] bool empty() const noexcept { return size() == 0; }
+    [[nodiscard]] const_iterator begin() const noexcept { return {*this, 0}; }
+    [[nodiscard]] const_iterator end() const noexcept { return {*this, size()}; }
+    [[nodiscard]] const_iterator find(std::string_view key) const noexcept;
+    [[nodiscard]] bool contains(std::string_view key) const noexcept { return find(key) != end(); }
+    [[nodiscard]] std::size_t count(std::string_view key) const noexcept { return contains(key); }
+    /// Throws std::out_of_range when there is no such member.
+    [[nodiscard]] PropertyValue at(std::string_view key) const;
+
+    /// Member by member.
+    friend bool operator==(const DictionaryView& a, const DictionaryView& b) noexcept {
+        return vexa_value_equal(a.dictionary_, b.dictionary_);
+    }
+    friend bool operator==(const DictionaryView& a, const Dictionary& b) noexcept;
+
+private:
+    friend class PropertyValue;
+    friend const_iterator;
+
+    explicit DictionaryView(const vexa_value* dictionary) noexcept : dictionary_(dictionary) {}
+    [[nodiscard]] value_type item(std::size_t index) const noexcept;
+
+    const vexa_value* dictionary_ = nullptr;
+};
 
 }  // namespace Vexa

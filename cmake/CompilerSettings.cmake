@@ -15,6 +15,15 @@ endif()
 # own, so nothing may be fused.
 add_compile_options(-ffp-contract=off)
 
+# Everything may end up in a shared library, and nothing leaves one but what says so.
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_C_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+set(CMAKE_C_STANDARD 11)
+set(CMAKE_C_STANDARD_REQUIRED ON)
+set(CMAKE_C_EXTENSIONS OFF)
+
 add_compile_options(-Wall -Wextra -Wpedantic -Wshadow -Wconversion)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_LESS 13)
     # It warns of overlaps inside the library's own string concatenation, wrongly.

@@ -1,5 +1,6 @@
 # What is used from Debian (installed by script/bootstrap):
-#   HeaderOnlyBoost, HeaderOnlyCli   header-only, so they serve a cross build as well
+#   HeaderOnlyBoost, HeaderOnlyCli, HeaderOnlySpdlog, HeaderOnlyFmt,
+#   HeaderOnlySystemd, HeaderOnlySdt              header-only, so they serve a cross build as well
 #   VexaGoogleTest                   gtest and gmock with their main
 #   rapidcheck, benchmark::benchmark_main
 find_package(Threads REQUIRED)
@@ -24,6 +25,21 @@ endfunction()
 
 vexa_header_only(HeaderOnlyBoost boost json.hpp)
 vexa_header_only(HeaderOnlyCli CLI CLI.hpp)
+vexa_header_only(HeaderOnlySpdlog spdlog spdlog.h)
+vexa_header_only(HeaderOnlyFmt fmt format.h)
+vexa_header_only(HeaderOnlySystemd systemd sd-journal.h)
+
+# Trace points are one header that serves every machine; Debian keeps it with the host's own.
+find_file(VEXA_SDT_HEADER sys/sdt.h PATHS /usr/include
+          PATH_SUFFIXES "${CMAKE_HOST_SYSTEM_PROCESSOR}-linux-gnu" NO_CMAKE_FIND_ROOT_PATH REQUIRED)
+add_library(HeaderOnlySdt INTERFACE)
+if(CMAKE_CROSSCOMPILING)
+    get_filename_component(sdt_folder "${VEXA_SDT_HEADER}" DIRECTORY)
+    file(COPY "${VEXA_SDT_HEADER}" "${sdt_folder}/sdt-config.h"
+         DESTINATION "${PROJECT_BINARY_DIR}/header-only-sdt/sys")
+    target_include_directories(HeaderOnlySdt SYSTEM INTERFACE
+                               "${PROJECT_BINARY_DIR}/header-only-sdt")
+endif()
 
 if(VEXA_TESTS)
     add_library(VexaGoogleTest INTERFACE)

@@ -1,6 +1,10 @@
 # vexa_sources(<variable> <folder>): every .cpp below the folder, which need not exist yet.
+# Platform/Library is a target of its own and belongs to none of the folders above it.
 function(vexa_sources variable folder)
     file(GLOB_RECURSE sources CONFIGURE_DEPENDS "${folder}/*.cpp")
+    if(NOT folder MATCHES "/Library$")
+        list(FILTER sources EXCLUDE REGEX "/Platform/Library/")
+    endif()
     set(${variable} "${sources}" PARENT_SCOPE)
 endfunction()
 

@@ -1,0 +1,204 @@
+#include "Platform/Library/LiveObjects.h"
+
+#include <vexa/queue.h>
+
+#include <pthread.h>
+#include <semaphore.h>
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <csignal>
+#include <cstdint>
+#include <cstring>
+#include <new>
+
+namespace {
+
+using Vexa::Library::Counted;
+
+// sem_wait, come what may.
+void waitFor(sem_t& semaphore) noexcept {
+    while (::sem_wait(&semaphore) != 0 && errno == EINTR) {
+    }
+}
+
+// Signals go to the threads of the program, which expects them.
+class SignalsBlocked {
+public:
+    SignalsBlocked() noexcept {
+        sigset_t all;
+        sigfillset(&all);
+        static_cast<void>(pthread_sigmask(SIG_SETMASK, &all, &before_));
+    }
+    ~SignalsBlocked() { static_cast<void>(pthread_sigmask(SIG_SETMASK, &before_, nullptr)); }
+    SignalsBlocked(const SignalsBlocked&) = delete;
+    SignalsBlocked(SignalsBlocked&&) = delete;
+    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
+    SignalsBlocked& operator=(SignalsBlocked&&) = delete;
+
+private:
+    sigset_t before_{};
+};
+
+// The queue whose thread this is.
+constinit thread_local const vexa_queue* current = nullptr;
+
+}  // namespace
+
+/// Whoever submits pushes its task on a stack, without a lock that a slower thread could hold; the
+/// queue's thread takes the whole stack and turns it over. The push onto an empty stack wakes the
+/// thread, so there is one wake for each time that it takes the stack, never more.
+struct vexa_queue final : private Counted<VEXA_OBJECT_QUEUE> {
+public:
+    static vexa_queue* create(const char* label) noexcept {
+        auto* const queue = new (std::nothrow) vexa_queue;
+        if (!queue) return nullptr;
+        if (!queue->start(label)) {
+            delete queue;
+            return nullptr;
+        }
+        return queue;
+    }
+
+    void retain() noexcept { references_.fetch_add(1, std::memory_order_relaxed); }
+
+    void release() noexcept {
+        if (references_.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
+        if (isCurrent()) {
+            // Seen once the task that we are in has returned.
+            orphaned_ = true;
+            static_cast<void>(pthread_detach(thread_));
+            return;
+        }
+        push(end_);
+        static_cast<void>(pthread_join(thread_, nullptr));
+        delete this;
+    }
+
+    bool submit(vexa_task task, void* context) noexcept {
+        auto* const node = new (std::nothrow) Node{.task = task, .context = context, .owned = true};
+        if (!node) return false;
+        push(*node);
+        return true;
+    }
+
+    void drain() noexcept {
+        if (isCurrent()) return;
+        sem_t done;
+        static_cast<void>(::sem_init(&done, 0, 0));
+        Node node{.task = [](void* context) { ::sem_post(static_cast<sem_t*>(context)); },
+                  .context = &done};
+        push(node);
+        waitFor(done);
+        static_cast<void>(::sem_destroy(&done));
+    }
+
+    [[nodiscard]] bool isCurrent() const noexcept { return current == this; }
+
+private:
+    struct Node {
+        vexa_task task = nullptr;
+        void* context = nullptr;
+        bool owned = false;
+        Node* next = nullptr;
+    };
+
+    vexa_queue() noexcept { static_cast<void>(::sem_init(&work_, 0, 0)); }
+    ~vexa_queue() { static_cast<void>(::sem_destroy(&work_)); }
+
+    bool start(const char* label) noexcept {
+        if (label) std::strncpy(name_.data(), label, name_.size() - 1);
+        const SignalsBlocked blocked;
+        const auto body = [](void* queue) -> void* {
+            static_cast<vexa_queue*>(queue)->work();
+            return nullptr;
+        };
+        return pthread_create(&thread_, nullptr, body, this) == 0;
+    }
+
+    void push(Node& node) noexcept {
+        Node* older = newest_.load(std::memory_order_relaxed);
+        do {
+            node.next = older;
+        } while (!newest_.compare_exchange_weak(older, &node, std::memory_order_release,
+                                                std::memory_order_relaxed));
+        // The node may have run and be gone by now.
+        if (!older) static_cast<void>(::sem_post(&work_));
+    }
+
+    void work() noexcept {
+        current = this;
+        if (name_[0] != '\0') {
+            static_cast<void>(pthread_setname_np(pthread_self(), name_.data()));
+        }
+        for (;;) {
+            if (!orphaned_) waitFor(work_);
+            Node* task = takeInOrder();
+            // Only an orphan finds nothing: nobody is left who could submit.
+            if (!task) break;
+            while (task) {
+                if (task == &end_) return;
+                Node* const next = task->next;
+                runOnce(*task);
+                task = next;
+            }
+        }
+        delete this;
+    }
+
+    Node* takeInOrder() noexcept {
+        Node* newest = newest_.exchange(nullptr, std::memory_order_acquire);
+        Node* oldest = nullptr;
+        while (newest) {
+            Node* const older = newest->next;
+            newest->next = oldest;
+            oldest = newest;
+            newest = older;
+        }
+        return oldest;
+    }
+
+    // A node that is not owned lies on the stack of a thread that goes on when it has run.
+    static void runOnce(Node& node) noexcept {
+        const Node task = node;
+        if (task.owned) delete &node;
+        task.task(task.context);
+    }
+
+    std::atomic<std::uint32_t> references_{1};
+    std::atomic<Node*> newest_{nullptr};
+    sem_t work_{};
+    pthread_t thread_{};
+    std::array<char, 16> name_{};
+    Node end_;
+    bool orphaned_ = false;  // the queue's own thread only
+};
+
+extern "C" {
+
+vexa_queue* vexa_queue_create(const char* label) noexcept {
+    return vexa_queue::create(label);
+}
+
+vexa_queue* vexa_queue_retain(vexa_queue* queue) noexcept {
+    if (queue) queue->retain();
+    return queue;
+}
+
+void vexa_queue_release(vexa_queue* queue) noexcept {
+    if (queue) queue->release();
+}
+
+bool vexa_queue_submit(vexa_queue* queue, vexa_task task, void* context) noexcept {
+    return queue->submit(task, context);
+}
+
+void vexa_queue_drain(vexa_queue* queue) noexcept {
+    queue->drain();
+}
+
+bool vexa_queue_is_current(const vexa_queue* queue) noexcept {
+    return queue && queue->isCurrent();
+}
+
+}  // extern "C"
