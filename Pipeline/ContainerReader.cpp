@@ -14,7 +14,7 @@ namespace VexaTouch {
 
 namespace {
 
-using Frame = PipelineRecording::Frame;
+using Frame = RecordedFrame;
 
 /// How a member was given; of duplicates the last one.
 enum class Given : std::uint8_t { No, Wrong, Right };
@@ -41,7 +41,7 @@ struct FrameMembers {
 /// What became of the array of one of the two versions.
 struct FrameArray {
     Given given = Given::No;
-    std::list<Frame> frames;
+    FrameList frames;
     std::uint64_t elements = 0;
     std::uint64_t refused = 0;
     const char* migrationFault = nullptr;  // first of its kind, with its position
@@ -252,14 +252,15 @@ public:
     /// Takes the plain frames at the front of the text; gives how many characters they were.
     std::size_t scanFrames(std::string_view text) {
         FrameScanner scanner(text);
-        while (scanner.scan(frames_.frames.emplace_back())) {
+        Frame frame;
+        while (scanner.scan(frame)) {
+            frames_.frames.push_back(std::move(frame));
             ++frames_.elements;
         }
-        frames_.frames.pop_back();
         return scanner.position();
     }
 
-    std::list<Frame> takeFrames() {
+    FrameList takeFrames() {
         if (!isObject_) {
             failMigration(Container::InvalidContainer);
         }
@@ -461,7 +462,7 @@ private:
             return;
         }
         Frame& from = members_.frame;
-        Frame& frame = array.frames.emplace_back();
+        Frame frame;
         frame.timestamp = from.timestamp;
         if (members_.typeName == TypeName::State) {
             frame.type = Frame::Type::State;
@@ -471,6 +472,7 @@ private:
             frame.type = Frame::Type::InputReport;
             frame.report = std::move(from.report);
         }
+        array.frames.push_back(std::move(frame));
     }
 
     static std::uint64_t readUnsigned(const Vexa::JsonNumber& number) {
@@ -543,7 +545,7 @@ bool ContainerReader::write(std::string_view piece) {
     return !state_->malformed;
 }
 
-std::list<PipelineRecording::Frame> ContainerReader::finish() {
+FrameList ContainerReader::finish() {
     state_->malformed = state_->malformed || !state_->parser.finish();
     if (state_->malformed) {
         Handler::failMigration(Container::InvalidContainer);
@@ -568,7 +570,7 @@ std::optional<std::uint64_t> ContainerReader::errorFrame() const noexcept {
     return state_->handler.errorFrame();
 }
 
-std::list<PipelineRecording::Frame> ContainerReader::recover() {
+FrameList ContainerReader::recover() {
     return std::move(state_->handler.arrayToRecover().frames);
 }
 

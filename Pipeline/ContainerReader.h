@@ -1,9 +1,8 @@
 #pragma once
 
-#include "Pipeline/PipelineRecording.h"
+#include "Pipeline/FrameList.h"
 
 #include <cstdint>
-#include <list>
 #include <memory>
 #include <optional>
 #include <string>
@@ -28,7 +27,7 @@ public:
     bool write(std::string_view piece);
 
     /// Ends the text and gives its frames. Throws as PipelineRecording's constructor does.
-    std::list<PipelineRecording::Frame> finish();
+    FrameList finish();
 
     /// The version that the text names (its low 32 bits), as far as read.
     [[nodiscard]] std::optional<std::uint32_t> version() const noexcept;
@@ -41,7 +40,7 @@ public:
 
     /// For texts that are damaged or cut off: the whole, well-formed frames read so far, of
     /// whichever version. The reader is spent afterwards.
-    std::list<PipelineRecording::Frame> recover();
+    FrameList recover();
     /// Whole frames read so far that were refused.
     [[nodiscard]] std::uint64_t refusedFrames() const noexcept;
 

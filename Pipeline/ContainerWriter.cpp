@@ -32,8 +32,8 @@ void ContainerWriter::begin() {
     json_.beginArray();
 }
 
-void ContainerWriter::write(const PipelineRecording::Frame& frame) {
-    using Type = PipelineRecording::Frame::Type;
+void ContainerWriter::write(const RecordedFrame& frame) {
+    using Type = RecordedFrame::Type;
     if (frame.type != Type::InputReport && frame.type != Type::State) {
         return;
     }

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "Pipeline/PipelineRecording.h"
+#include "Pipeline/RecordedFrame.h"
 #include "Platform/Json.h"
 
 #include <functional>
@@ -24,7 +24,7 @@ public:
     ContainerWriter& operator=(const ContainerWriter&) = delete;
 
     /// Appends one frame; a frame of an unknown type is skipped.
-    void write(const PipelineRecording::Frame& frame);
+    void write(const RecordedFrame& frame);
     /// Closes the document. Nothing may be written afterwards.
     void finish();
 

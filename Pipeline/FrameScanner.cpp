@@ -44,9 +44,9 @@ bool FrameScanner::skipQuote() noexcept {
     return true;
 }
 
-bool FrameScanner::scan(PipelineRecording::Frame& frame) {
+bool FrameScanner::scan(RecordedFrame& frame) {
     next_ = position_;
-    frame.type = PipelineRecording::Frame::Type::InputReport;
+    frame.type = RecordedFrame::Type::InputReport;
     if (!skip('{') || !scanMembers(frame) || !skip('}') || !skip(',')) {
         return false;
     }
@@ -54,13 +54,13 @@ bool FrameScanner::scan(PipelineRecording::Frame& frame) {
     return true;
 }
 
-bool FrameScanner::scanMembers(PipelineRecording::Frame& frame) {
+bool FrameScanner::scanMembers(RecordedFrame& frame) {
     unsigned seen = 0;
     return scanMember(frame, seen) && skip(',') && scanMember(frame, seen) && skip(',') &&
            scanMember(frame, seen) && seen == kSeenAll;
 }
 
-bool FrameScanner::scanMember(PipelineRecording::Frame& frame, unsigned& seen) {
+bool FrameScanner::scanMember(RecordedFrame& frame, unsigned& seen) {
     if (!skip('"')) {
         return false;
     }

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "Pipeline/PipelineRecording.h"
+#include "Pipeline/RecordedFrame.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -20,14 +20,14 @@ public:
 
     /// Reads one plain frame and the comma behind it. False, with nothing read and `frame`
     /// unspecified, when there is none. Throws nothing but std::bad_alloc.
-    bool scan(PipelineRecording::Frame& frame);
+    bool scan(RecordedFrame& frame);
 
     /// Characters read so far.
     [[nodiscard]] std::size_t position() const noexcept { return position_; }
 
 private:
-    bool scanMembers(PipelineRecording::Frame& frame);
-    bool scanMember(PipelineRecording::Frame& frame, unsigned& seen);
+    bool scanMembers(RecordedFrame& frame);
+    bool scanMember(RecordedFrame& frame, unsigned& seen);
     bool skip(char expected) noexcept;
     template <const std::string_view& expected>
     bool skipText() noexcept;

@@ -30,7 +30,7 @@ PropertyValue migratedFrame(const PropertyValue& report) {
 }  // namespace
 
 PropertyValue PipelineRecording::migrateSerializedContainer(const PropertyValue& container) {
-    if (container.asDictionary() == nullptr) {
+    if (!container.asDictionary()) {
         throw std::invalid_argument(Container::InvalidContainer);
     }
     const PropertyValue number = container.member(Container::Version);
@@ -47,7 +47,7 @@ PropertyValue PipelineRecording::migrateSerializedContainer(const PropertyValue&
     }
     PropertyValue::Array frames;
     const PropertyValue reports = container.member(Container::Reports);
-    if (const auto* elements = reports.asArray()) {
+    if (const auto elements = reports.asArray()) {
         frames.reserve(elements->size());
         for (const PropertyValue& report : *elements) {
             frames.push_back(migratedFrame(report));

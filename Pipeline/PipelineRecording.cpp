@@ -2,11 +2,11 @@
 
 #include "Pipeline/ContainerReader.h"
 #include "Pipeline/ContainerWriter.h"
+#include "Pipeline/TrimRule.h"
 #include "Shared/Util.h"
 
-#include <limits>
+#include <iterator>
 #include <stdexcept>
-#include <unordered_set>
 #include <utility>
 
 namespace VexaTouch {
@@ -14,29 +14,6 @@ namespace VexaTouch {
 namespace {
 
 using Frame = PipelineRecording::Frame;
-using FrameList = std::list<Frame>;
-
-/// Trims as PipelineRecording::trimFrames does. `erase` erases a frame and returns the next one.
-template <typename Erase>
-void trim(FrameList& frames, std::size_t maxCount, Erase erase) {
-    // Views of kept frames' keys: a kept frame outlives the walk.
-    std::unordered_set<std::string_view> seenKeys;
-    std::size_t keptReports = 0;
-    for (auto next = frames.end(); next != frames.begin();) {
-        const auto frame = std::prev(next);
-        bool keep = true;
-        if (frame->type == Frame::Type::State) {
-            keep = seenKeys.insert(frame->key).second;
-        } else if (frame->type == Frame::Type::InputReport) {
-            keep = keptReports < maxCount;
-            if (keep) {
-                ++keptReports;
-                seenKeys.clear();
-            }
-        }
-        next = keep ? frame : erase(frame);
-    }
-}
 
 /// Whole microseconds to wait, clamped before it becomes an integer. The division by the speed is
 /// single precision like every number of the system.
@@ -47,7 +24,7 @@ std::uint64_t waitMicroseconds(std::uint64_t nanoseconds, float speed) noexcept 
                                  : static_cast<std::uint64_t>(kLimit);
 }
 
-std::list<Frame> readFrames(std::optional<std::string_view> data) {
+FrameList readFrames(std::optional<std::string_view> data) {
     if (!data) {
         throw std::invalid_argument("json not supplied");
     }
@@ -63,7 +40,7 @@ PipelineRecording::PipelineRecording(Vexa::HostClock& clock) : clock_(&clock) {}
 PipelineRecording::PipelineRecording(std::optional<std::string_view> data, Vexa::HostClock& clock)
     : _frames(readFrames(data)), clock_(&clock) {}
 
-PipelineRecording::PipelineRecording(std::list<Frame> frames, Vexa::HostClock& clock)
+PipelineRecording::PipelineRecording(FrameList frames, Vexa::HostClock& clock)
     : _frames(std::move(frames)), clock_(&clock) {}
 
 PipelineRecording::PipelineRecording(const PipelineRecording& other)
@@ -135,7 +112,15 @@ void PipelineRecording::appendFrame(Frame frame) {
 }
 
 void PipelineRecording::trimFrames(std::list<Frame>& frames, std::size_t maxCount) {
-    trim(frames, maxCount, [&](FrameList::iterator frame) { return frames.erase(frame); });
+    TrimRule keeps(maxCount);
+    for (auto next = frames.end(); next != frames.begin();) {
+        const auto frame = std::prev(next);
+        next = keeps(*frame) ? frame : frames.erase(frame);
+    }
+}
+
+void PipelineRecording::trimFrames(FrameList& frames, std::size_t maxCount) {
+    frames.retain(TrimRule(maxCount));
 }
 
 void PipelineRecording::setMaxFrameCount(std::size_t count) {
@@ -147,19 +132,24 @@ void PipelineRecording::trimToCap() {
     if (_maxFrameCount == 0) {
         return;
     }
-    trim(_frames, _maxFrameCount, [this](FrameList::iterator frame) {
-        const auto next = std::next(frame);
-        if (_play.valid && frame == _play.iterator) {
-            _play.valid = false;
+    TrimRule keeps(_maxFrameCount);
+    // The frame under the cursor, and how many are kept from there on.
+    const Frame* next = playCanContinue() ? &*_play.iterator : nullptr;
+    std::ptrdiff_t upcoming = 0;
+    _frames.retain([&](const Frame& frame) {
+        const bool keep = keeps(frame);
+        if (next != nullptr) {
+            upcoming += keep ? 1 : 0;
+            if (&frame == next) {
+                _play.valid = keep;
+                next = nullptr;
+            }
         }
-        if (_play.current == frame) {
-            // A probe that is being called for this very frame asked for the trim.
-            _play.erasedCurrent.splice(_play.erasedCurrent.end(), _frames, frame);
-        } else {
-            _frames.erase(frame);
-        }
-        return next;
+        return keep;
     });
+    if (_play.valid) {
+        _play.iterator = std::prev(_frames.end(), upcoming);
+    }
 }
 
 void PipelineRecording::playReset() {
@@ -177,8 +167,9 @@ void PipelineRecording::playNextFrame(float speed) {
     if (!playCanContinue()) {
         throw std::runtime_error("playback finished");
     }
-    _play.current = _play.iterator++;
-    const Frame& frame = **_play.current;
+    // Probes may record and trim meanwhile.
+    const FrameList::Pin pin = _frames.pin(_play.iterator++);
+    const Frame& frame = *pin;
     if (frame.type == Frame::Type::InputReport) {
         waitForFrame(frame, speed > 0.0F ? speed : 1.0F);
     }
@@ -189,8 +180,6 @@ void PipelineRecording::playNextFrame(float speed) {
     } else if (frame.type == Frame::Type::State) {
         Pipeline::setState(frame.key, frame.value);
     }
-    _play.current.reset();
-    _play.erasedCurrent.clear();
 }
 
 void PipelineRecording::waitForFrame(const Frame& frame, float speed) {

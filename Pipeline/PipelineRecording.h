@@ -1,6 +1,8 @@
 #pragma once
 
+#include "Pipeline/FrameList.h"
 #include "Pipeline/Pipeline.h"
+#include "Pipeline/RecordedFrame.h"
 #include "Platform/HostClock.h"
 #include "Platform/PropertyValue.h"
 
@@ -8,32 +10,20 @@
 #include <cstdint>
 #include <list>
 #include <optional>
-#include <span>
 #include <string>
 #include <string_view>
-#include <vector>
 
 namespace VexaTouch {
 
 /// A pipeline that records every input it is given, keeps the recording bounded, can write it as a
 /// JSON document and can replay it frame by frame into itself.
 ///
-/// Not synchronised: the owner serialises all calls. Copyable; a copy has its own frames (values
-/// are shared) and starts with playback idle.
+/// Not synchronised: the owner serialises all calls. Copyable; a copy starts with playback idle. It
+/// shares the frames, which never change, and costs little however many there are; neither notices
+/// what becomes of the other, also on another thread.
 class PipelineRecording final : public Pipeline {
 public:
-    /// One recorded input.
-    struct Frame {
-        enum class Type : std::int32_t { State = 0, InputReport = 1 };
-
-        Type type = Type::InputReport;
-        std::uint64_t timestamp = 0;       ///< host time of the input in nanoseconds
-        std::string key;                   ///< State only: the key as the pipeline received it
-        Vexa::PropertyValue value;         ///< State only: the value as received
-        std::vector<std::uint8_t> report;  ///< InputReport only: the raw report, id included
-
-        friend bool operator==(const Frame&, const Frame&) = default;
-    };
+    using Frame = RecordedFrame;
 
     /// An empty, unbounded recording that takes its time from `clock` (which must outlive it).
     explicit PipelineRecording(Vexa::HostClock& clock = Vexa::HostClock::system());
@@ -45,7 +35,7 @@ public:
                                Vexa::HostClock& clock = Vexa::HostClock::system());
 
     /// A recording of these frames, unbounded, ready to be played.
-    explicit PipelineRecording(std::list<Frame> frames,
+    explicit PipelineRecording(FrameList frames,
                                Vexa::HostClock& clock = Vexa::HostClock::system());
 
     PipelineRecording(const PipelineRecording& other);
@@ -67,13 +57,14 @@ public:
     /// Keeps the newest `maxCount` input reports and, for each state key, the state frames that
     /// still matter: the newest of each key between two kept reports and before the oldest one.
     static void trimFrames(std::list<Frame>& frames, std::size_t maxCount);
+    static void trimFrames(FrameList& frames, std::size_t maxCount);
 
     /// Sets how many input reports are kept, 0 for all; trims at once if not 0. A trim that erases
     /// the frame under the playback cursor ends the playback.
     void setMaxFrameCount(std::size_t count);
     [[nodiscard]] std::uint64_t maxFrameCount() const noexcept { return _maxFrameCount; }
 
-    [[nodiscard]] const std::list<Frame>& frames() const noexcept { return _frames; }
+    [[nodiscard]] const FrameList& frames() const noexcept { return _frames; }
 
     /// Starts or restarts playback from the first frame.
     void playReset();
@@ -95,19 +86,16 @@ public:
 private:
     struct Playback {
         bool valid = false;
-        std::list<Frame>::iterator iterator;
+        FrameList::Iterator iterator;
         std::uint64_t startTimeMach = 0;                     ///< host ticks
         std::optional<std::uint64_t> lastInputReportTimeNs;  ///< recorded time
-        /// The frame being played, while it is: probes may record and trim meanwhile.
-        std::optional<std::list<Frame>::iterator> current;
-        std::list<Frame> erasedCurrent;  ///< keeps that frame when a trim erased it
     };
 
-    /// Trims without erasing the frame under the cursor of a running playback unnoticed.
+    /// Trims; the cursor of a running playback goes along with its frame or ends with it.
     void trimToCap();
     void waitForFrame(const Frame& frame, float speed);
 
-    std::list<Frame> _frames;  ///< oldest first
+    FrameList _frames;  ///< oldest first
     std::uint64_t _maxFrameCount = 0;
     Playback _play;
     Vexa::HostClock* clock_;
