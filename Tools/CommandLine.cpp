@@ -48,10 +48,13 @@ std::unique_ptr<CLI::App> makeParser(const Command& command) {
         addOption(*app, option);
     }
     for (const PositionalEntry& positional : command.positionals) {
-        app->add_option(std::string(positional.name))
-            ->expected(1)
-            ->allow_extra_args(false)
-            ->required(positional.required);
+        CLI::Option* added = app->add_option(std::string(positional.name));
+        if (positional.repeatable) {
+            added->expected(1, -1)->allow_extra_args();
+        } else {
+            added->expected(1)->allow_extra_args(false);
+        }
+        added->required(positional.required);
     }
     return app;
 }

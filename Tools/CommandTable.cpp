@@ -2,10 +2,15 @@
 
 #include "Tools/ConvertCommand.h"
 #include "Tools/DiffCommand.h"
+#include "Tools/GetCommand.h"
 #include "Tools/InfoCommand.h"
+#include "Tools/LatencyCommand.h"
 #include "Tools/ReplayCommand.h"
+#include "Tools/RunCommand.h"
+#include "Tools/SetCommand.h"
 #include "Tools/ShowCommand.h"
 #include "Tools/SynthCommand.h"
+#include "Tools/ValidateCommand.h"
 
 #include <algorithm>
 #include <array>
@@ -16,7 +21,8 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &replayCommand, &infoCommand, &showCommand, &convertCommand, &synthCommand, &diffCommand,
+    &runCommand,  &getCommand,  &setCommand,     &latencyCommand, &validateCommand, &replayCommand,
+    &infoCommand, &showCommand, &convertCommand, &synthCommand,   &diffCommand,
 };
 
 }  // namespace

@@ -27,6 +27,7 @@ struct PositionalEntry {
     std::string_view help;  ///< one sentence without its full stop
     bool required = true;
     ValueKind kind = ValueKind::File;
+    bool repeatable = false;  ///< the last one only
 };
 
 struct OptionEntry {

@@ -17,7 +17,7 @@ namespace {
 
 constexpr std::string_view kProgram = "vexatouch";
 constexpr std::string_view kPurpose =
-    "Plays, shows, converts and makes recordings of a small touch surface";
+    "Runs the service of a small touch surface, plays, shows, converts and makes recordings of it";
 constexpr std::string_view kOverview =
     "A recording holds every input of the surface's service: raw input reports and settings, each "
     "with its time. It is a JSON document; - as FILE reads it from standard input. Results go to "
@@ -123,6 +123,7 @@ std::string synopsis(const Command& command) {
     for (const PositionalEntry& positional : command.positionals) {
         line += positional.required ? " " : " [";
         line += positional.name;
+        line += positional.repeatable ? "..." : "";
         line += positional.required ? "" : "]";
     }
     return line;
@@ -254,7 +255,9 @@ std::string helpText(const Command& command) {
             text += literal;
             text += '\n';
         });
-    text += "\nArguments:\n";
+    if (!command.positionals.empty()) {
+        text += "\nArguments:\n";
+    }
     for (const PositionalEntry& positional : command.positionals) {
         appendTerm(text, positional.name, positional.help);
     }
@@ -312,7 +315,9 @@ std::string manPage(const Command& command) {
         command.description,
         [&](std::string_view paragraph) { page += ".PP\n" + roff(paragraph) + "\n"; },
         [&](std::string_view literal) { appendManLiteral(page, literal); });
-    page += ".SH ARGUMENTS\n";
+    if (!command.positionals.empty()) {
+        page += ".SH ARGUMENTS\n";
+    }
     for (const PositionalEntry& positional : command.positionals) {
         appendManTerm(page, positional.name, positional.help);
     }

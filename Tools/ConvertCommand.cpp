@@ -16,7 +16,6 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
-#include <list>
 #include <optional>
 #include <stdexcept>
 #include <string>
@@ -24,8 +23,6 @@
 
 namespace VexaTouch::Tools {
 namespace {
-
-using Frames = std::list<PipelineRecording::Frame>;
 
 constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "FILE", .help = "The recording; - reads standard input"},
@@ -158,7 +155,7 @@ void warn(Streams& streams, std::string_view text) {
     streams.error << "vexatouch convert: warning: " << text << '\n';
 }
 
-Frames readHidRecording(const std::string& path, Streams& streams) {
+FrameList readHidRecording(const std::string& path, Streams& streams) {
     InputFile file(path, streams);
     HidRecorderReader reader;
     Progress progress(streams, "reading " + file.name(), file.size(), 16);
@@ -169,7 +166,7 @@ Frames readHidRecording(const std::string& path, Streams& streams) {
             reader.write(piece);
             progress.update(bytes);
         }
-        Frames frames = reader.finish();
+        FrameList frames = reader.finish();
         if (reader.otherDevicesEvents() > 0) {
             warn(streams, file.name() + ": left out " +
                               counted(reader.otherDevicesEvents(), "event") +
@@ -182,7 +179,7 @@ Frames readHidRecording(const std::string& path, Streams& streams) {
 }
 
 // Says what was lost, one line for each damaged place.
-Frames recover(const std::string& path, Format format, Streams& streams) {
+FrameList recover(const std::string& path, Format format, Streams& streams) {
     constexpr std::size_t kMostLines = 10;
     InputFile file(path, streams);
     const std::string text = file.rest();
@@ -206,7 +203,7 @@ Frames recover(const std::string& path, Format format, Streams& streams) {
 }
 
 // True if a finger was on the surface where what is left begins.
-bool cut(Frames& frames, const Side& from, const Side& to, const std::string& name) {
+bool cut(FrameList& frames, const Side& from, const Side& to, const std::string& name) {
     const std::uint64_t begin = from.place ? frameAt(frames, *from.place) : 0;
     const std::uint64_t end = to.place ? frameAt(frames, *to.place) : frames.size();
     if (begin >= end) {
@@ -218,7 +215,7 @@ bool cut(Frames& frames, const Side& from, const Side& to, const std::string& na
 }
 
 template <class Writer>
-void writeFrames(const Frames& frames, OutputFile& file, Streams& streams) {
+void writeFrames(const FrameList& frames, OutputFile& file, Streams& streams) {
     Writer writer([&file](std::string_view piece) { file.write(piece); });
     Progress progress(streams, "writing " + file.name(), frames.size());
     std::uint64_t written = 0;
@@ -230,7 +227,7 @@ void writeFrames(const Frames& frames, OutputFile& file, Streams& streams) {
 }
 
 template <class Export>
-void writeReplay(Frames frames, OutputFile& file, Streams& streams) {
+void writeReplay(FrameList frames, OutputFile& file, Streams& streams) {
     Replay replay(std::move(frames));
     Export writer([&file](std::string_view piece) { file.write(piece); });
     Progress progress(streams, "writing " + file.name(), replay.frames().size());
@@ -241,7 +238,7 @@ void writeReplay(Frames frames, OutputFile& file, Streams& streams) {
     writer.finish();
 }
 
-void writeAs(Format format, Frames frames, const std::string& path, Streams& streams) {
+void writeAs(Format format, FrameList frames, const std::string& path, Streams& streams) {
     if (format == Format::Container) {
         writeRecording(frames, path, streams);
         return;
@@ -264,7 +261,7 @@ int runConvert(const Arguments& arguments, Streams& streams) {
     const std::string input = arguments.value("FILE");
     const std::string name = input == "-" ? "standard input" : input;
 
-    Frames frames;
+    FrameList frames;
     if (arguments.given("--recover")) {
         frames = recover(input, from.format, streams);
     } else if (from.format == Format::HidRecorder) {

@@ -10,7 +10,6 @@
 #include <algorithm>
 #include <array>
 #include <cstdint>
-#include <list>
 #include <span>
 #include <string>
 #include <utility>
@@ -121,7 +120,7 @@ std::string eventsText(std::span<const EventRecord> events) {
 /// Plays one side; the snapshot is that of its last frame.
 class Side {
 public:
-    Side(std::list<PipelineRecording::Frame> frames, std::span<const Setting> settings)
+    Side(FrameList frames, std::span<const Setting> settings)
         : replay_(std::move(frames), settings) {}
 
     /// False when the recording has ended.
@@ -316,7 +315,7 @@ int runDiff(const Arguments& arguments, Streams& streams) {
         throw UsageError("only one recording can come from standard input");
     }
     RecordingFile fileA = readSide(arguments.value("A"), streams);
-    std::list<PipelineRecording::Frame> framesB =
+    FrameList framesB =
         arguments.given("B") ? readSide(arguments.value("B"), streams).frames : fileA.frames;
     Side a(std::move(fileA.frames), settingsA);
     Side b(std::move(framesB), settingsB);

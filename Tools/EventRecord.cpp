@@ -76,9 +76,9 @@ std::uint64_t numberMember(const Vexa::PropertyValue& object, std::string_view n
         throw Failure("\"" + std::string(name) + "\" is missing");
     }
     std::uint64_t number = 0;
-    if (const std::uint64_t* wide = value.asUnsigned()) {
+    if (const auto wide = value.asUnsigned()) {
         number = *wide;
-    } else if (const std::int64_t* narrow = value.asSigned(); narrow != nullptr && *narrow >= 0) {
+    } else if (const auto narrow = value.asSigned(); narrow && *narrow >= 0) {
         number = static_cast<std::uint64_t>(*narrow);
     } else {
         throw Failure("\"" + std::string(name) + "\" is no unsigned integer");
@@ -91,13 +91,13 @@ std::uint64_t numberMember(const Vexa::PropertyValue& object, std::string_view n
 
 EventKind kindMember(const Vexa::PropertyValue& object) {
     const Vexa::PropertyValue value = object.member("kind");
-    const std::string* name = value.asString();
-    if (name == nullptr) {
+    const auto name = value.asString();
+    if (!name) {
         throw Failure("\"kind\" is missing or no string");
     }
     const auto kind = eventKindFromName(*name);
     if (!kind) {
-        throw Failure("\"kind\" is \"" + *name + "\", which is no kind of event");
+        throw Failure("\"kind\" is \"" + std::string(*name) + "\", which is no kind of event");
     }
     return *kind;
 }
@@ -118,8 +118,8 @@ std::optional<EventKind> eventKindFromName(std::string_view name) noexcept {
 
 EventRecord eventRecordFromHidEvent(const Vexa::HidEvent& event) {
     EventRecord record;
-    const Vexa::DigitizerEventRecord* digitizer = event.digitizerRecord();
-    if (digitizer == nullptr) {
+    const auto digitizer = event.digitizerRecord();
+    if (!digitizer) {
         // The pipeline makes one vendor-defined event only: the notice of a firmware reset.
         record.kind = EventKind::FirmwareReset;
         return record;
@@ -147,18 +147,24 @@ std::string_view regionMeaning(EventKind kind, std::uint32_t region) noexcept {
     }
 }
 
-void appendEventJson(std::string& text, const EventRecord& event) {
-    text += "{\"index\":";
-    text += std::to_string(event.index);
-    appendNumberMember(text, "time_ns", event.timeNs);
-    appendNumberMember(text, "device_ms", event.deviceMs);
-    appendNumberMember(text, "frame", event.frame);
+void appendEventMembers(std::string& text, const EventRecord& event) {
+    text += "\"frame\":";
+    text += std::to_string(event.frame);
     text += ",\"kind\":\"";
     text += eventKindName(event.kind);
     text += '"';
     appendNumberMember(text, "region", event.region);
     appendNumberMember(text, "phase", event.phase);
     appendNumberMember(text, "mask", event.mask);
+}
+
+void appendEventJson(std::string& text, const EventRecord& event) {
+    text += "{\"index\":";
+    text += std::to_string(event.index);
+    appendNumberMember(text, "time_ns", event.timeNs);
+    appendNumberMember(text, "device_ms", event.deviceMs);
+    text += ',';
+    appendEventMembers(text, event);
     text += '}';
 }
 
@@ -170,8 +176,8 @@ std::string eventJson(const EventRecord& event) {
 
 EventRecord eventFromJson(std::string_view line) {
     const Vexa::PropertyValue object = Vexa::readJson(line);
-    const Vexa::PropertyValue::Dictionary* members = object.asDictionary();
-    if (members == nullptr) {
+    const auto members = object.asDictionary();
+    if (!members) {
         throw Failure("no JSON object");
     }
     constexpr auto max32 = std::numeric_limits<std::uint32_t>::max();

@@ -45,6 +45,9 @@ EventRecord eventRecordFromHidEvent(const Vexa::HidEvent& event);
 /// "none" for region 0.
 std::string_view regionMeaning(EventKind kind, std::uint32_t region) noexcept;
 
+/// Appends the members that say what happened, without braces:
+/// "frame":..,"kind":"..","region":..,"phase":..,"mask":..
+void appendEventMembers(std::string& text, const EventRecord& event);
 /// Appends the event as one JSON object, without a line feed:
 /// {"index":..,"time_ns":..,"device_ms":..,"frame":..,"kind":"..","region":..,"phase":..,"mask":..}
 void appendEventJson(std::string& text, const EventRecord& event);

@@ -115,9 +115,9 @@ std::string FrameView::eventLine(const EventRecord& event) const {
 std::string FrameView::heading(const PlayedFrame& played) const {
     std::string text;
     appendBold(text, depth_);
-    text += fitted("frame " + std::to_string(played.index) + " of " + std::to_string(frameCount_) +
-                       "   " + secondsText(played.frame->timestamp, startNs_) + "   " +
-                       whatText(played),
+    const std::string count = frameCount_ != 0 ? " of " + std::to_string(frameCount_) : "";
+    text += fitted("frame " + std::to_string(played.index) + count + "   " +
+                       secondsText(played.frame->timestamp, startNs_) + "   " + whatText(played),
                    columns_);
     appendPlain(text, depth_);
     return text;

@@ -17,7 +17,8 @@ namespace VexaTouch::Tools {
 /// phase, the scores and the events.
 class FrameView {
 public:
-    /// `startNs` is the recorded time of the first frame, from which times are counted.
+    /// `startNs` is the recorded time of the first frame, from which times are counted. A
+    /// `frameCount` of 0 is one that is not known.
     FrameView(ColorDepth depth, std::size_t columns, std::uint64_t startNs,
               std::uint64_t frameCount);
 

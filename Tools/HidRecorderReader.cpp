@@ -155,7 +155,7 @@ void HidRecorderReader::write(std::string_view piece) {
     pending_.append(piece);
 }
 
-std::list<Frame> HidRecorderReader::finish() {
+FrameList HidRecorderReader::finish() {
     if (!pending_.empty()) {
         readLine(pending_, false);
         pending_.clear();

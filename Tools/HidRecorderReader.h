@@ -4,7 +4,6 @@
 
 #include <cstdint>
 #include <functional>
-#include <list>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -27,7 +26,7 @@ public:
 
     /// Ends the text and gives its frames; the reader is then spent. Throws as write does, and
     /// std::invalid_argument when the text holds no line of the format at all.
-    std::list<PipelineRecording::Frame> finish();
+    FrameList finish();
 
     /// Events of further devices, which were left out.
     [[nodiscard]] std::uint64_t otherDevicesEvents() const noexcept { return otherEvents_; }
@@ -40,7 +39,7 @@ private:
     void readDevice(std::string_view text);
 
     FaultHandler onFault_;
-    std::list<PipelineRecording::Frame> frames_;
+    FrameList frames_;
     std::string pending_;  // the beginning of a line whose end has not come yet
     std::uint64_t lineNumber_ = 0;
     std::uint64_t start_ = 0;        // recorded time of the events' zero, in ns

@@ -8,8 +8,10 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <csignal>
 #include <iostream>
+#include <string_view>
 #include <utility>
 
 namespace VexaTouch::Tools {
@@ -18,6 +20,14 @@ namespace {
 constexpr std::array<int, 3> kSignals = {SIGINT, SIGTERM, SIGHUP};
 
 volatile std::sig_atomic_t arrivedSignal = 0;
+
+constexpr std::string_view kHideCursor = "\x1B[?25l";
+constexpr std::string_view kShowCursor = "\x1B[0m\x1B[?25h";
+
+// What abandon() needs, apart from the screen that may be going away meanwhile.
+std::atomic<bool> cursorHidden = false;
+std::atomic<bool> keyboardIsRaw = false;
+termios keyboardBefore{};
 
 extern "C" void rememberSignal(int signal) {
     arrivedSignal = signal;
@@ -46,14 +56,19 @@ LiveScreen::LiveScreen(Streams& streams) : streams_(streams), saved_(std::make_u
         raw.c_lflag &= ~static_cast<tcflag_t>(ICANON | ECHO);
         raw.c_cc[VMIN] = 0;
         raw.c_cc[VTIME] = 0;
+        keyboardBefore = saved_->keyboard;
         saved_->keyboardChanged = tcsetattr(STDIN_FILENO, TCSANOW, &raw) == 0;
+        keyboardIsRaw = saved_->keyboardChanged;
         saved_->readsKeys = saved_->keyboardChanged;
     }
-    streams_.out << "\x1B[?25l" << std::flush;
+    cursorHidden = &streams_.out == &std::cout;
+    streams_.out << kHideCursor << std::flush;
 }
 
 LiveScreen::~LiveScreen() {
-    streams_.out << "\x1B[0m\x1B[?25h" << std::flush;
+    streams_.out << kShowCursor << std::flush;
+    cursorHidden = false;
+    keyboardIsRaw = false;
     if (saved_->keyboardChanged) {
         tcsetattr(STDIN_FILENO, TCSANOW, &saved_->keyboard);
     }
@@ -107,6 +122,15 @@ char LiveScreen::pressedKey() {
         saved_->readsKeys = false;  // the terminal is gone
     }
     return key;
+}
+
+void LiveScreen::abandon() noexcept {
+    if (cursorHidden) {
+        static_cast<void>(::write(STDOUT_FILENO, kShowCursor.data(), kShowCursor.size()) > 0);
+    }
+    if (keyboardIsRaw) {
+        tcsetattr(STDIN_FILENO, TCSANOW, &keyboardBefore);
+    }
 }
 
 int LiveScreen::interrupted() noexcept {

@@ -30,6 +30,10 @@ public:
     /// The time on the streams' clock.
     [[nodiscard]] std::uint64_t nowNs() const;
 
+    /// Makes the terminal as it was, when the process ends without destroying the screen. Any
+    /// thread.
+    static void abandon() noexcept;
+
     /// The signal that arrived and asks for an end, or 0.
     [[nodiscard]] static int interrupted() noexcept;
 

@@ -1,13 +1,10 @@
 #include "Tools/LogOptions.h"
 
-#include "Platform/Log.h"
 #include "Tools/Failure.h"
 
-#include <array>
+#include <cstddef>
 #include <optional>
 #include <string_view>
-#include <utility>
-#include <vector>
 
 namespace VexaTouch::Tools {
 namespace {
@@ -31,50 +28,47 @@ std::string allNames() {
     return text;
 }
 
-std::pair<LogCategory, LogLevel> parse(std::string_view text) {
-    const std::size_t equals = text.find('=');
-    if (equals != std::string_view::npos) {
-        const auto category = Vexa::logCategoryFromName(text.substr(0, equals));
-        const auto level = Vexa::logLevelFromName(text.substr(equals + 1));
-        if (category && level) {
-            return {*category, *level};
-        }
-    }
-    throw UsageError("--log " + std::string(text) + ": CATEGORY=LEVEL is needed; " + allNames());
-}
+/// The level that a text sets for a category, if it does.
+using Levels = std::array<std::optional<LogLevel>, Vexa::kLogCategoryCount>;
 
-void restoreLevels() {
-    for (int i = 0; i < Vexa::kLogCategoryCount; ++i) {
-        Vexa::Log::setLevel(static_cast<LogCategory>(i), LogLevel::Error);
+void parse(std::string_view text, Levels& levels) {
+    const std::size_t equals = text.find('=');
+    const bool isForAll = equals == std::string_view::npos;
+    const auto level = Vexa::logLevelFromName(isForAll ? text : text.substr(equals + 1));
+    const auto category =
+        isForAll ? std::nullopt : Vexa::logCategoryFromName(text.substr(0, equals));
+    if (!level || (!isForAll && !category)) {
+        throw UsageError("--log " + std::string(text) + ": LEVEL or CATEGORY=LEVEL is needed; " +
+                         allNames());
+    }
+    if (isForAll) {
+        levels.fill(level);
+    } else {
+        levels[static_cast<std::size_t>(*category)] = level;
     }
 }
 
 }  // namespace
 
-LogOptions::LogOptions(std::span<const std::string> texts, Streams& streams)
-    : active_(!texts.empty()) {
-    std::vector<std::pair<LogCategory, LogLevel>> levels;
+LogOptions::LogOptions(std::span<const std::string> texts) : before_() {
+    Levels levels;
     for (const std::string& text : texts) {
-        levels.push_back(parse(text));
+        parse(text, levels);
     }
-    if (!active_) {
-        return;
-    }
-    Vexa::Log::setSink(
-        [&error = streams.error](LogCategory category, LogLevel level, std::string_view message) {
-            error << '[' << Vexa::logCategoryName(category) << "] " << Vexa::logLevelName(level)
-                  << ": " << message << '\n';
-        });
-    for (const auto& [category, level] : levels) {
-        Vexa::Log::setLevel(category, level);
+    for (std::size_t i = 0; i < levels.size(); ++i) {
+        const auto category = static_cast<LogCategory>(i);
+        before_[i] = Vexa::Log::level(category);
+        if (levels[i]) {
+            Vexa::Log::setLevel(category, *levels[i]);
+        }
     }
 }
 
 LogOptions::~LogOptions() {
-    if (active_) {
-        restoreLevels();
-        Vexa::Log::setSink({});
+    for (std::size_t i = 0; i < before_.size(); ++i) {
+        Vexa::Log::setLevel(static_cast<LogCategory>(i), before_[i]);
     }
+    Vexa::Log::flush();
 }
 
 }  // namespace VexaTouch::Tools

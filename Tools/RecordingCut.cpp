@@ -1,6 +1,7 @@
 #include "Tools/RecordingCut.h"
 
 #include "Pipeline/Pipeline.h"
+#include "Pipeline/TrimRule.h"
 
 #include <algorithm>
 #include <charconv>
@@ -20,11 +21,6 @@ std::optional<Number> numberFromText(std::string_view text) {
         return std::nullopt;
     }
     return value;
-}
-
-std::list<Frame>::iterator at(std::list<Frame>& frames, std::uint64_t index) {
-    return std::next(frames.begin(),
-                     static_cast<std::ptrdiff_t>(std::min<std::uint64_t>(index, frames.size())));
 }
 
 }  // namespace
@@ -50,7 +46,7 @@ std::optional<CutPlace> CutPlace::fromText(std::string_view text) {
     return CutPlace{Unit::Nanoseconds, static_cast<std::uint64_t>(std::llround(*time * unit))};
 }
 
-std::uint64_t frameAt(const std::list<Frame>& frames, CutPlace place) {
+std::uint64_t frameAt(const FrameList& frames, CutPlace place) {
     if (place.unit == CutPlace::Unit::Frames) {
         return std::min<std::uint64_t>(place.value, frames.size());
     }
@@ -64,17 +60,18 @@ std::uint64_t frameAt(const std::list<Frame>& frames, CutPlace place) {
     return static_cast<std::uint64_t>(std::distance(frames.begin(), found));
 }
 
-bool cutFrames(std::list<Frame>& frames, std::uint64_t begin, std::uint64_t end) {
+bool cutFrames(FrameList& frames, std::uint64_t begin, std::uint64_t end) {
     const bool midTouch = touchesAfter(frames, begin);
-    frames.erase(at(frames, end), frames.end());
-    std::list<Frame> settings;
-    settings.splice(settings.begin(), frames, frames.begin(), at(frames, begin));
-    PipelineRecording::trimFrames(settings, 0);
-    frames.splice(frames.begin(), settings);
+    TrimRule matters(0);
+    std::uint64_t index = frames.size();
+    frames.retain([&](const Frame& frame) {
+        --index;
+        return index < end && (index >= begin || matters(frame));
+    });
     return midTouch;
 }
 
-bool keepNewestReports(std::list<Frame>& frames, std::uint64_t count) {
+bool keepNewestReports(FrameList& frames, std::uint64_t count) {
     std::uint64_t begin = frames.size();
     std::uint64_t kept = 0;
     for (auto frame = frames.rbegin(); frame != frames.rend() && kept < count; ++frame) {
@@ -86,7 +83,7 @@ bool keepNewestReports(std::list<Frame>& frames, std::uint64_t count) {
     return midTouch;
 }
 
-bool touchesAfter(const std::list<Frame>& frames, std::uint64_t count) {
+bool touchesAfter(const FrameList& frames, std::uint64_t count) {
     Pipeline pipeline;
     for (const Frame& frame : frames) {
         if (count == 0) {

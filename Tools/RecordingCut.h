@@ -3,7 +3,6 @@
 #include "Pipeline/PipelineRecording.h"
 
 #include <cstdint>
-#include <list>
 #include <optional>
 #include <string_view>
 
@@ -25,18 +24,18 @@ struct CutPlace {
 
 /// The index of the frame at that place: the first one recorded at or after that time, or the
 /// number of frames if there is none.
-std::uint64_t frameAt(const std::list<PipelineRecording::Frame>& frames, CutPlace place);
+std::uint64_t frameAt(const FrameList& frames, CutPlace place);
 
 /// Leaves the frames [begin, end) and, before them, the newest state frame of each key from the
 /// frames that were cut away in front, so that the settings in force are kept. Other state of the
 /// algorithm is lost: true if a finger was on the surface where the cut begins.
-bool cutFrames(std::list<PipelineRecording::Frame>& frames, std::uint64_t begin, std::uint64_t end);
+bool cutFrames(FrameList& frames, std::uint64_t begin, std::uint64_t end);
 
 /// Keeps the newest `count` input reports as a bounded recording does (PipelineRecording's
 /// trimFrames). True if a finger was on the surface where the oldest of them begins.
-bool keepNewestReports(std::list<PipelineRecording::Frame>& frames, std::uint64_t count);
+bool keepNewestReports(FrameList& frames, std::uint64_t count);
 
 /// Whether a finger is on the surface after the first `count` frames.
-bool touchesAfter(const std::list<PipelineRecording::Frame>& frames, std::uint64_t count);
+bool touchesAfter(const FrameList& frames, std::uint64_t count);
 
 }  // namespace VexaTouch::Tools

@@ -66,8 +66,7 @@ RecordingFile readRecording(const std::string& path, Streams& streams) {
     return file;
 }
 
-void writeRecording(const std::list<PipelineRecording::Frame>& frames, const std::string& path,
-                    Streams& streams) {
+void writeRecording(const FrameList& frames, const std::string& path, Streams& streams) {
     OutputFile file(path, streams);
     ContainerWriter writer([&file](std::string_view piece) { file.write(piece); });
     Progress progress(streams, "writing " + file.name(), frames.size());

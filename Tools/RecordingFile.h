@@ -5,7 +5,6 @@
 #include "Tools/Streams.h"
 
 #include <cstdint>
-#include <list>
 #include <string>
 
 namespace VexaTouch::Tools {
@@ -13,7 +12,7 @@ namespace VexaTouch::Tools {
 /// A recording as it was read from a file.
 struct RecordingFile {
     std::string name;  ///< for messages: the path, or "standard input"
-    std::list<PipelineRecording::Frame> frames;
+    FrameList frames;
     std::uint32_t version = 0;    ///< of the container
     std::uint64_t textBytes = 0;  ///< size of the text that was read
 };
@@ -25,7 +24,6 @@ RecordingFile readRecording(const std::string& path, Streams& streams);
 
 /// Writes a version-1 container to a path, or to the result stream for "-". The file appears whole
 /// or not at all. Throws Failure.
-void writeRecording(const std::list<PipelineRecording::Frame>& frames, const std::string& path,
-                    Streams& streams);
+void writeRecording(const FrameList& frames, const std::string& path, Streams& streams);
 
 }  // namespace VexaTouch::Tools

@@ -19,7 +19,7 @@ constexpr std::string_view kBeginVersion0 = R"({"Version":0,"Reports":[)";
 constexpr std::string_view kBeginVersion1 = R"({"Version":1,"Frames":[)";
 
 struct Attempt {
-    std::list<Frame> frames;
+    FrameList frames;
     std::uint64_t refused = 0;             // whole elements that are no frames
     std::string fault;                     // of the document as a whole, empty when it is good
     std::string syntaxError;               // why the text could not be read on
@@ -115,7 +115,7 @@ RecordingRecovery recoverContainer(std::string_view text) {
         position = resumed->position;
         attempt = std::move(resumed->attempt);
         refused += attempt.refused;
-        recovery.frames.splice(recovery.frames.end(), attempt.frames);
+        recovery.frames.append(std::move(attempt.frames));
     }
     if (refused > 0) {
         recovery.damages.push_back(elementsText(refused));

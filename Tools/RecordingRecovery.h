@@ -3,7 +3,6 @@
 #include "Pipeline/PipelineRecording.h"
 
 #include <cstdint>
-#include <list>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -13,7 +12,7 @@ namespace VexaTouch::Tools {
 
 /// What could be saved of a damaged recording.
 struct RecordingRecovery {
-    std::list<PipelineRecording::Frame> frames;
+    FrameList frames;
     std::optional<std::uint32_t> version;  ///< of the container, where that much was left of it
     std::vector<std::string> damages;      ///< what was lost and where; empty when nothing was
 };

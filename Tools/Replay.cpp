@@ -18,8 +18,7 @@ std::string_view playedTypeName(PlayedType type) noexcept {
     return "state";
 }
 
-Replay::Replay(std::list<PipelineRecording::Frame> frames, std::span<const Setting> settings,
-               Vexa::HostClock& clock)
+Replay::Replay(FrameList frames, std::span<const Setting> settings, Vexa::HostClock& clock)
     : recording_(std::move(frames), clock), upcoming_(recording_.frames().begin()) {
     installProbes();
     recording_.playReset();

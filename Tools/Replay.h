@@ -9,7 +9,6 @@
 
 #include <cstdint>
 #include <limits>
-#include <list>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -50,8 +49,7 @@ class Replay {
 public:
     static constexpr float kNoWaiting = std::numeric_limits<float>::infinity();
 
-    explicit Replay(std::list<PipelineRecording::Frame> frames,
-                    std::span<const Setting> settings = {},
+    explicit Replay(FrameList frames, std::span<const Setting> settings = {},
                     Vexa::HostClock& clock = Vexa::HostClock::system());
     ~Replay() = default;
     Replay(const Replay&) = delete;
@@ -65,16 +63,14 @@ public:
 
     /// The algorithm as it stands after the last frame.
     [[nodiscard]] const Algs& algs() const noexcept { return recording_.algs(); }
-    [[nodiscard]] const std::list<PipelineRecording::Frame>& frames() const noexcept {
-        return recording_.frames();
-    }
+    [[nodiscard]] const FrameList& frames() const noexcept { return recording_.frames(); }
     [[nodiscard]] const ReplayCounts& counts() const noexcept { return counts_; }
 
 private:
     void installProbes();
 
     PipelineRecording recording_;
-    std::list<PipelineRecording::Frame>::const_iterator upcoming_;
+    FrameList::Iterator upcoming_;
     PlayedFrame played_;
     std::vector<EventRecord> events_;
     ReplayCounts counts_;

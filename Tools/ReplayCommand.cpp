@@ -55,13 +55,7 @@ constexpr std::array<OptionEntry, 6> kOptions = {{
      .help = "Compare the events with a file of lines as --json prints them; print only what "
              "differs, side by side",
      .kind = ValueKind::File},
-    {.name = "--log",
-     .valueName = "CATEGORY=LEVEL",
-     .help = "Show log messages of HIDService, Pipeline, Recording or Algs from the level debug, "
-             "info, error or off on",
-     .repeatable = true,
-     .kind = ValueKind::Choice,
-     .choices = "Algs=debug Pipeline=debug Recording=debug HIDService=debug"},
+    kLogOption,
 }};
 
 constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
@@ -205,7 +199,7 @@ int runReplay(const Arguments& arguments, Streams& streams) {
     if (expecting && arguments.value("--trace") == "-") {
         throw UsageError("--expect and --trace - both want standard output");
     }
-    const LogOptions logging(arguments.values("--log"), streams);
+    const LogOptions logging(arguments.values(kLogOption.name));
     std::vector<EventRecord> expected;
     if (expecting) {
         expected = readExpectedEvents(arguments.value("--expect"));

@@ -4,6 +4,7 @@
 #include "Tools/Failure.h"
 #include "Tools/FrameView.h"
 #include "Tools/LiveScreen.h"
+#include "Tools/OptionValues.h"
 #include "Tools/RecordingFile.h"
 #include "Tools/Replay.h"
 #include "Tools/SettingKeys.h"
@@ -125,18 +126,6 @@ float parseSpeed(const std::string& text) {
         throw UsageError("--speed " + text + ": not a number above 0");
     }
     return speed;
-}
-
-ColorDepth parseColor(const Arguments& arguments, const Streams& streams) {
-    const std::string text = arguments.value("--color");
-    if (text == "auto") {
-        return detectColorDepth(streams);
-    }
-    const auto depth = colorDepthFromText(text);
-    if (!depth) {
-        throw UsageError("--color " + text + ": not auto, never, 256 or truecolor");
-    }
-    return *depth;
 }
 
 void printTexts(Replay& replay, const FrameRange& range, bool showUnsigned, const std::string& name,
@@ -345,7 +334,7 @@ private:
 int runShow(const Arguments& arguments, Streams& streams) {
     const std::vector<Setting> settings = parseSettings(arguments.values("--set"));
     const float speed = parseSpeed(arguments.value("--speed"));
-    const ColorDepth depth = parseColor(arguments, streams);
+    const ColorDepth depth = colorOption(arguments, "--color", streams);
     const bool text = arguments.given("--text");
     if (arguments.given("--unsigned") && !text) {
         throw UsageError("--unsigned needs --text");

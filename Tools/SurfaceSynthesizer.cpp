@@ -338,9 +338,8 @@ void SurfaceSynthesizer::wander() {
     }
 }
 
-std::list<PipelineRecording::Frame> synthesize(const GestureScript& script,
-                                               std::optional<std::uint64_t> seed) {
-    std::list<PipelineRecording::Frame> frames;
+FrameList synthesize(const GestureScript& script, std::optional<std::uint64_t> seed) {
+    FrameList frames;
     SurfaceSynthesizer synthesizer(
         [&frames](PipelineRecording::Frame frame) { frames.push_back(std::move(frame)); }, seed);
     synthesizer.perform(script);

@@ -8,7 +8,6 @@
 #include <array>
 #include <cstdint>
 #include <functional>
-#include <list>
 #include <optional>
 #include <string>
 
@@ -94,8 +93,7 @@ private:
 };
 
 /// All frames of a script.
-std::list<PipelineRecording::Frame> synthesize(const GestureScript& script,
-                                               std::optional<std::uint64_t> seed = std::nullopt);
+FrameList synthesize(const GestureScript& script, std::optional<std::uint64_t> seed = std::nullopt);
 
 /// A script of a plausible mixed session of about `durationMs`: taps, holds and slides on all three
 /// buttons, palms, hovers, hurried and clumsy touches, settings, firmware events, invalid reports,

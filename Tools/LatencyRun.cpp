@@ -1,0 +1,201 @@
+#include "Tools/LatencyRun.h"
+
+#include "Tools/HostedDevice.h"
+#include "Tools/SimulatedSurface.h"
+
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <exception>
+#include <limits>
+#include <memory>
+#include <span>
+#include <thread>
+#include <utility>
+
+namespace VexaTouch::Tools {
+
+const std::string_view kLatencyGestures =
+    "approach 0ms\n"
+    "liftoff 0ms\n"
+    "gap 10ms\n"
+    "tap vol+ 10ms\n"
+    "tap play 10ms\n"
+    "tap vol- 10ms\n";
+
+namespace {
+
+/// Enough reports were taken from a source without end.
+struct Enough final : std::exception {};
+
+/// The first reports of a source, with the state frames between them.
+void playFirst(const PlayedDevice::FrameSource& source, std::size_t reports,
+               const PlayedDevice::FrameSink& sink) {
+    std::size_t count = 0;
+    source([&](const PlayedDevice::Frame& frame) {
+        if (count >= reports) {
+            throw Enough();
+        }
+        count += frame.type == PlayedDevice::Frame::Type::InputReport ? 1U : 0U;
+        sink(frame);
+    });
+}
+
+/// When the reader reads, by the place of the report that is about to be sent. Taking turns, it has
+/// as many reports as its absence, which goes first.
+class ReaderTurns {
+public:
+    explicit ReaderTurns(const LatencyRunOptions& options)
+        : reader_(options.reader),
+          reports_(options.reports),
+          turn_(std::clamp<std::size_t>(static_cast<std::size_t>(options.rate / 2), 1, reports_)) {}
+
+    [[nodiscard]] bool isOn(std::size_t report) const {
+        return reader_ == LatencyReader::On ||
+               (reader_ == LatencyReader::Turns && inRound(report) >= turnOf(report));
+    }
+    [[nodiscard]] bool changes(std::size_t report) const {
+        return report == 0 || isOn(report) != isOn(report - 1);
+    }
+
+private:
+    [[nodiscard]] std::size_t inRound(std::size_t report) const { return report % (2 * turn_); }
+    /// The last round may be shorter.
+    [[nodiscard]] std::size_t turnOf(std::size_t report) const {
+        return std::min(turn_, reports_ - report / (2 * turn_) * turn_);
+    }
+
+    LatencyReader reader_;
+    std::size_t reports_;  ///< of each, with and without
+    std::size_t turn_;     ///< in reports
+};
+
+/// Reads the recording without pause while it is turned on, on a thread of its own.
+class RecordingReader {
+public:
+    explicit RecordingReader(const Host::HostSession& session)
+        : thread_([this, &session] {
+              while (waitUntilOn()) {
+                  readOnce(session);
+              }
+          }) {}
+    ~RecordingReader() { finish(); }
+    RecordingReader(const RecordingReader&) = delete;
+    RecordingReader& operator=(const RecordingReader&) = delete;
+
+    /// Any thread.
+    void turn(bool on) noexcept { tell(on ? State::On : State::Off); }
+    /// Ends the reading.
+    void finish() {
+        tell(State::Finished);
+        if (thread_.joinable()) {
+            thread_.join();
+        }
+    }
+    /// What the reading was, once it is finished.
+    void describe(LatencyResult& result) const {
+        result.recordingReads = reads_;
+        result.recordingReadNs = reads_ == 0 ? 0 : readNs_ / reads_;
+        result.recordingBytes = bytes_;
+    }
+
+private:
+    enum class State : int { Off, On, Finished };
+
+    void tell(State state) noexcept {
+        state_.store(state);
+        state_.notify_all();
+    }
+    bool waitUntilOn() const noexcept {
+        state_.wait(State::Off);
+        return state_.load() != State::Finished;
+    }
+    void readOnce(const Host::HostSession& session) {
+        const auto start = std::chrono::steady_clock::now();
+        const Vexa::PropertyValue recording = session.property("Recording");
+        const std::chrono::nanoseconds time = std::chrono::steady_clock::now() - start;
+        readNs_ += static_cast<std::uint64_t>(time.count());
+        ++reads_;
+        if (const auto text = recording.asString()) {
+            bytes_ = text->size();
+        }
+    }
+
+    std::atomic<State> state_ = State::Off;
+    std::uint64_t reads_ = 0;
+    std::uint64_t readNs_ = 0;
+    std::uint64_t bytes_ = 0;
+    std::thread thread_;
+};
+
+LatencyResult resultOf(const LatencyProbe& probe, const ReaderTurns& turns, bool withReader,
+                       const RecordingReader& reader) {
+    LatencyResult result;
+    for (const LatencyStage stage : kLatencyStages) {
+        result.stages[static_cast<std::size_t>(stage)] = LatencySummary::of(probe.latencies(
+            stage, [&](std::size_t report) { return turns.isOn(report) == withReader; }));
+    }
+    result.inputThread = probe.inputThread();
+    result.queueThread = probe.queueThread();
+    result.hadReader = withReader;
+    if (withReader) {
+        reader.describe(result);
+    }
+    return result;
+}
+
+}  // namespace
+
+std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options) {
+    const PlayedDevice::FrameSource filling =
+        gestureSource(GestureScript::parse(kLatencyGestures), {}, true);
+    const PlayedDevice::FrameSource* source = &filling;
+    std::size_t reports = kFullRecording;
+    const auto device = std::make_shared<PlayedDevice>(
+        [&](const PlayedDevice::FrameSink& sink) { playFirst(*source, reports, sink); },
+        PlayedPace{.speed = std::numeric_limits<double>::infinity()}, SurfaceIdentity{},
+        Vexa::HostClock::system());
+    std::atomic<LatencyProbe*> listening = nullptr;
+    HostedDevice hosted(device, [&listening](const Vexa::HidEvent& event) {
+        if (LatencyProbe* probe = listening.load()) {
+            probe->delivered(event);
+        }
+    });
+    hosted.begin();
+    hosted.waitUntilPlayed();
+    hosted.halt();
+
+    source = &options.source;
+    reports = options.reports * (options.reader == LatencyReader::Turns ? 2 : 1);
+    device->setPace({.rate = options.rate});
+    LatencyProbe probe(reports, options.mayBeRealTime);
+    listening.store(&probe);
+    const ReaderTurns turns(options);
+    RecordingReader reader(hosted.session());
+    PlayedHooks hooks = probe.hooks();
+    hooks.onSend = [&, send = hooks.onSend,
+                    next = std::size_t{0}](std::span<const std::uint8_t> report) mutable {
+        if (turns.changes(next)) {
+            reader.turn(turns.isOn(next));
+        }
+        ++next;
+        send(report);
+    };
+    hosted.begin(std::move(hooks));
+    hosted.waitUntilPlayed();
+    reader.finish();
+    hosted.halt();
+    listening.store(nullptr);
+    hosted.end();
+
+    std::vector<LatencyResult> results;
+    if (options.reader != LatencyReader::On) {
+        results.push_back(resultOf(probe, turns, false, reader));
+    }
+    if (options.reader != LatencyReader::Off) {
+        results.push_back(resultOf(probe, turns, true, reader));
+    }
+    return results;
+}
+
+}  // namespace VexaTouch::Tools

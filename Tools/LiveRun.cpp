@@ -1,0 +1,235 @@
+#include "Tools/LiveRun.h"
+
+#include "Platform/HostClock.h"
+#include "Platform/PropertyValue.h"
+#include "Shared/Util.h"
+#include "Tools/Failure.h"
+#include "Tools/FrameView.h"
+#include "Tools/OutputFile.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdio>
+#include <utility>
+
+namespace VexaTouch::Tools {
+namespace {
+
+constexpr std::string_view kPipelineDomain = "Pipeline.";
+constexpr auto kDrawInterval = std::chrono::nanoseconds(1'000'000'000 / 30);
+
+std::uint64_t nowTicks() {
+    return Vexa::HostClock::system().now();
+}
+
+std::string counted(std::uint64_t count, std::string_view what) {
+    return std::to_string(count) + ' ' + std::string(what) + (count == 1 ? "" : "s");
+}
+
+std::string microseconds(double ns) {
+    constexpr double kNsPerUs = 1e3;
+    std::array<char, 48> text{};
+    std::snprintf(text.data(), text.size(), "%.1f us", ns / kNsPerUs);
+    return text.data();
+}
+
+}  // namespace
+
+LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<PlayedDevice>& device,
+                 LiveRunOptions options, SignalWatch& signals, const WakeUp& wake, Streams& streams)
+    : device_(device),
+      options_(std::move(options)),
+      signals_(signals),
+      wake_(wake),
+      streams_(streams),
+      startNs_(Util::nanosecondsFromMachTime(nowTicks())),
+      inbox_(wake),
+      registration_(device),
+      session_(library, registration_.service(), [this](const Vexa::HidEvent& event) {
+          inbox_.put(DeliveredEvent::of(event, nowTicks()));
+      }) {
+    if (options_.show) {
+        surface_ = std::make_unique<LiveSurface>(options_.depth, streams_.columns, startNs_,
+                                                 options_.settings);
+    }
+    installHooks();
+    for (const Setting& setting : options_.settings) {
+        if (!session_.setProperty(std::string(kPipelineDomain) + setting.key, setting.value)) {
+            throw Failure("the service does not take the setting " + setting.key);
+        }
+    }
+}
+
+LiveRun::~LiveRun() = default;
+
+void LiveRun::installHooks() {
+    PlayedHooks hooks;
+    hooks.onStateFrame = [this](const std::string& key, const Vexa::PropertyValue& value) {
+        session_.setProperty(std::string(kPipelineDomain) + key, value);
+        if (surface_) {
+            surface_->state(key, value);
+        }
+    };
+    hooks.onFinished = [this] {
+        finished_ = true;
+        wake_.notify();
+    };
+    hooks.onUnplugged = [this] {
+        unplugged_ = true;
+        wake_.notify();
+    };
+    if (surface_) {
+        hooks.onSend = [this](std::span<const std::uint8_t> report) { surface_->report(report); };
+    }
+    device_->setHooks(std::move(hooks));
+}
+
+void LiveRun::run() {
+    session_.begin();
+    if (options_.duration) {
+        deadline_ = std::chrono::steady_clock::now() + *options_.duration;
+    }
+    if (surface_) {
+        screen_ = std::make_unique<LiveScreen>(streams_);
+    } else if (!options_.json) {
+        streams_.out << deliveredEventHeading() << std::flush;
+    }
+    for (handleWork(); !isOver(); handleWork()) {
+        waitForWork();
+    }
+    session_.halt();
+    takeEvents();
+    draw(true);
+    screen_.reset();
+    if (!options_.recordFile.empty()) {
+        writeRecording();
+    }
+    session_.end();
+    printSummary();
+    if (unplugged_) {
+        throw Failure("the device was unplugged");
+    }
+}
+
+bool LiveRun::isOver() const {
+    return finished_ || unplugged_ || quit_ || signals_.endWanted() || !streams_.out.good() ||
+           (options_.count && totals_.events >= *options_.count) ||
+           (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
+}
+
+void LiveRun::waitForWork() const {
+    std::optional<Time> until = deadline_;
+    if (screen_) {
+        until = until ? std::min(*until, nextDraw_) : nextDraw_;
+    }
+    wake_.wait(until);
+}
+
+void LiveRun::handleWork() {
+    takeEvents();
+    if (screen_) {
+        handleKeys();
+        draw(false);
+    }
+    writeRecordingOnWish();
+}
+
+void LiveRun::takeEvents() {
+    for (const DeliveredEvent& event : inbox_.take()) {
+        if (options_.count && totals_.events >= *options_.count) {
+            return;
+        }
+        ++totals_.events;
+        totals_.latencySumNs += event.latencyNs;
+        totals_.latencyMostNs = std::max(totals_.latencyMostNs, event.latencyNs);
+        print(event);
+    }
+}
+
+void LiveRun::print(const DeliveredEvent& event) {
+    if (!screen_) {
+        streams_.out << (options_.json ? deliveredEventJson(event) + '\n'
+                                       : deliveredEventLine(event, startNs_))
+                     << std::flush;
+        return;
+    }
+    std::string line = deliveredEventLine(event, startNs_);
+    line.pop_back();
+    line.resize(std::min<std::size_t>(line.size(), streams_.columns));
+    newest_.push_back(std::move(line));
+    eventsChanged_ = true;
+    // What does not fit above the cursor would scroll away instead of being drawn over.
+    constexpr std::size_t kOthers = FrameView::kLines + 1;
+    const std::size_t room = streams_.rows > kOthers ? streams_.rows - kOthers : 0;
+    constexpr std::size_t kMost = 12;
+    while (newest_.size() > std::min(room, kMost)) {
+        newest_.pop_front();
+    }
+}
+
+void LiveRun::handleKeys() {
+    while (const char key = screen_->wait(0)) {
+        quit_ = quit_ || key == 'q';
+    }
+}
+
+void LiveRun::draw(bool anyway) {
+    const Time now = std::chrono::steady_clock::now();
+    if (!screen_ || (!anyway && now < nextDraw_)) {
+        return;
+    }
+    nextDraw_ = now + kDrawInterval;
+    const bool changed = surface_->update(Util::nanosecondsFromMachTime(nowTicks()));
+    if (!changed && !std::exchange(eventsChanged_, false) && !anyway) {
+        return;
+    }
+    std::vector<std::string> lines = surface_->lines();
+    lines.insert(lines.end(), newest_.begin(), newest_.end());
+    lines.resize(std::min<std::size_t>(lines.size(), std::max(streams_.rows, 2U) - 1));
+    screen_->draw(lines);
+}
+
+void LiveRun::writeRecordingOnWish() {
+    if (!signals_.takeRecordingWanted()) {
+        return;
+    }
+    if (options_.recordFile.empty()) {
+        streams_.error << "vexatouch run: SIGUSR1 writes a recording only with --record\n";
+        return;
+    }
+    try {
+        writeRecording();
+    } catch (const Failure& failure) {
+        // The run is worth more than this copy; the one at the end may still succeed.
+        streams_.error << "vexatouch run: " << failure.what() << '\n';
+    }
+}
+
+void LiveRun::writeRecording() {
+    const Vexa::PropertyValue recording = session_.property("Recording");
+    const auto text = recording.asString();
+    if (!text) {
+        throw Failure("the service gives no recording");
+    }
+    OutputFile file(options_.recordFile, streams_);
+    file.write(*text);
+    file.commit();
+    if (!screen_) {
+        streams_.error << "recording written to " << options_.recordFile << std::endl;
+    }
+}
+
+void LiveRun::printSummary() const {
+    streams_.error << counted(device_->sent(), "report") << " sent, " << device_->dropped()
+                   << " dropped, " << counted(totals_.events, "event");
+    if (totals_.events > 0) {
+        streams_.error << "; latency "
+                       << microseconds(static_cast<double>(totals_.latencySumNs) /
+                                       static_cast<double>(totals_.events))
+                       << " on average, "
+                       << microseconds(static_cast<double>(totals_.latencyMostNs)) << " at most";
+    }
+    streams_.error << '\n';
+}
+
+}  // namespace VexaTouch::Tools

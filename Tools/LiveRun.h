@@ -1,0 +1,105 @@
+#pragma once
+
+#include "Host/HostSession.h"
+#include "Host/PluginLibrary.h"
+#include "Platform/DeviceBackend.h"
+#include "Tools/DeliveredEvent.h"
+#include "Tools/EventInbox.h"
+#include "Tools/LiveScreen.h"
+#include "Tools/LiveSurface.h"
+#include "Tools/PlayedDevice.h"
+#include "Tools/SettingKeys.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/Streams.h"
+#include "Tools/TerminalColor.h"
+#include "Tools/WakeUp.h"
+
+#include <atomic>
+#include <chrono>
+#include <cstdint>
+#include <deque>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace VexaTouch::Tools {
+
+/// How a service is run.
+struct LiveRunOptions {
+    std::vector<Setting> settings = {};  ///< given to the service before it is scheduled
+    bool json = false;                   ///< events as JSON objects instead of columns
+    /// Draw the surface and the newest events in place of the columns.
+    bool show = false;
+    ColorDepth depth = ColorDepth::None;
+    std::string recordFile = {};  ///< where the recording goes; empty: nowhere
+    std::optional<std::chrono::nanoseconds> duration = {};
+    std::optional<std::uint64_t> count = {};  ///< of events
+};
+
+/// A service run by a host from its first step to its last: a plug-in, a device and somebody who
+/// looks at the events. It ends when the device has played everything or is gone, after a time,
+/// after a number of events, at a signal, or when nobody takes the events any more.
+///
+/// The thread that runs it prints, draws and writes; the input thread and the device's player only
+/// ever leave things for it.
+class LiveRun {
+public:
+    /// Walks the plug-in's life up to its event callback and gives it the settings. `signals` and
+    /// `wake` belong together. Everything given must outlive the run. Throws HostFailure and
+    /// Failure.
+    LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<PlayedDevice>& device,
+            LiveRunOptions options, SignalWatch& signals, const WakeUp& wake, Streams& streams);
+    ~LiveRun();
+    LiveRun(const LiveRun&) = delete;
+    LiveRun(LiveRun&&) = delete;
+    LiveRun& operator=(const LiveRun&) = delete;
+    LiveRun& operator=(LiveRun&&) = delete;
+
+    /// Runs to the end, the whole teardown included. Once. Throws HostFailure and Failure.
+    void run();
+
+private:
+    using Time = std::chrono::steady_clock::time_point;
+
+    struct Totals {
+        std::uint64_t events = 0;
+        std::uint64_t latencySumNs = 0;
+        std::uint64_t latencyMostNs = 0;
+    };
+
+    void installHooks();
+    [[nodiscard]] bool isOver() const;
+    void waitForWork() const;
+    void handleWork();
+    void takeEvents();
+    void print(const DeliveredEvent& event);
+    void handleKeys();
+    void draw(bool anyway);
+    void writeRecordingOnWish();
+    void writeRecording();
+    void printSummary() const;
+
+    std::shared_ptr<PlayedDevice> device_;
+    LiveRunOptions options_;
+    SignalWatch& signals_;
+    const WakeUp& wake_;
+    Streams& streams_;
+    std::uint64_t startNs_;
+    EventInbox inbox_;
+    std::unique_ptr<LiveSurface> surface_;
+    std::unique_ptr<LiveScreen> screen_;
+    std::deque<std::string> newest_;  // events under the picture
+    bool eventsChanged_ = false;
+    Totals totals_;
+    std::optional<Time> deadline_;
+    Time nextDraw_;
+    bool quit_ = false;
+    // Set by the device's threads.
+    std::atomic<bool> finished_ = false;
+    std::atomic<bool> unplugged_ = false;
+    Vexa::DeviceRegistration registration_;
+    Host::HostSession session_;
+};
+
+}  // namespace VexaTouch::Tools

@@ -1,0 +1,115 @@
+#include "Tools/SetCommand.h"
+
+#include "Platform/Json.h"
+#include "Tools/DeviceChoice.h"
+#include "Tools/Failure.h"
+#include "Tools/HostedDevice.h"
+#include "Tools/OptionValues.h"
+#include "Tools/SettingKeys.h"
+
+#include <array>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace VexaTouch::Tools {
+namespace {
+
+constexpr std::array<PositionalEntry, 2> kPositionals = {{
+    {.name = "KEY",
+     .help = "A setting (Pipeline.Algs.HoldTimeoutMilliseconds) or a property of the device",
+     .kind = ValueKind::Text},
+    {.name = "VALUE",
+     .help = "The value as JSON: 300, true, [1, 2]; a string with its quotes, '\"grey\"'",
+     .kind = ValueKind::Text},
+}};
+
+constexpr std::array<OptionEntry, 3> kOptions = {{
+    {.name = "--json", .help = "Print a JSON object with the key and its value"},
+    kDeviceOption,
+    kSeedOption,
+}};
+
+constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
+    {kExitSuccess, "the value was taken"},
+    {kExitFailure,
+     "nothing knows the key, the value was not taken, or the plug-in or the device cannot be used"},
+    {kExitUsage, "the command line is wrong, or the value is no JSON"},
+}};
+
+constexpr std::array<ExampleEntry, 2> kExamples = {{
+    {"vexatouch set Pipeline.Algs.HoldTimeoutMilliseconds 300", "Tries a setting"},
+    {"vexatouch set Product '\"My surface\"'", "Writes a property of the device"},
+}};
+
+constexpr std::string_view kDescription =
+    "Starts the service on a device, writes a property, prints what the property is then, and "
+    "stops "
+    "the service again; the value is gone with it.\n"
+    "\n"
+    "What is not in the domain \"Pipeline\" goes to the device, the service's own keys included: "
+    "writing them changes nothing in the service. A property that can be written but not read, "
+    "such "
+    "as Pipeline.Algs.ResetEventStats, prints nothing.";
+
+/// The service takes whatever is written in the pipeline's domain and ignores what it does not
+/// know.
+void checkKey(const std::string& key, const std::string& value) {
+    constexpr std::string_view kPipeline = "Pipeline.";
+    constexpr std::string_view kAlgorithm = "Pipeline.Algs.";
+    if (!key.starts_with(kPipeline)) {
+        return;
+    }
+    if (!key.starts_with(kAlgorithm)) {
+        throw Failure(key + ": nothing knows the key; settings begin with " +
+                      std::string(kAlgorithm));
+    }
+    try {
+        parseSetting(key + '=' + value, "set");
+    } catch (const UsageError& error) {
+        throw Failure(error.what());
+    }
+}
+
+int runSet(const Arguments& arguments, Streams& streams) {
+    const std::string key = arguments.value("KEY");
+    const std::string text = arguments.value("VALUE");
+    const Vexa::PropertyValue value = Vexa::readJson(text);
+    if (!value) {
+        throw UsageError("set " + key + ": the value is no JSON: " + text +
+                         " (a string needs its quotes: '\"" + text + "\"')");
+    }
+    checkKey(key, text);
+    const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
+    DeviceWishes wishes{.announceSeed = false};
+    wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
+    HostedDevice hosted(makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {});
+    hosted.begin();
+    if (!hosted.session().setProperty(key, value)) {
+        throw Failure(key + ": the device did not take the value");
+    }
+    const Vexa::PropertyValue now = hosted.session().property(key);
+    hosted.end();
+    if (arguments.given("--json")) {
+        streams.out << Vexa::writeJson(Vexa::PropertyValue::Dictionary{{key, now}}) << '\n';
+    } else if (now) {
+        streams.out << key << ": " << Vexa::writeJson(now, Vexa::JsonWriter::Style::Compact)
+                    << '\n';
+    }
+    return kExitSuccess;
+}
+
+}  // namespace
+
+constinit const Command setCommand = {
+    .name = "set",
+    .summary = "Write a property of the service and show what it is then",
+    .description = kDescription,
+    .positionals = kPositionals,
+    .options = kOptions,
+    .exitCodes = kExitCodes,
+    .examples = kExamples,
+    .run = runSet,
+};
+
+}  // namespace VexaTouch::Tools
