@@ -14,14 +14,11 @@
 #include <benchmark/benchmark.h>
 
 #include <malloc.h>
-
-#include <malloc.h>
 #include <unistd.h>
 
 #include <cstdint>
 #include <cstdlib>
 #include <fstream>
-#include <list>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -30,39 +27,36 @@ namespace VexaTouch {
 namespace {
 
 using Frame = PipelineRecording::Frame;
-using Frames = std::list<Frame>;
 using Testing::SessionGenerator;
 
 constexpr std::size_t kFrames = 300'000;
 constexpr std::size_t kPieceBytes = 65'536;
 
-Frames makeFrames() {
-    Frames frames;
+FrameList makeFrames() {
+    FrameList frames;
     SessionGenerator generator(1);
     std::uint64_t timestampNs = 5'000'000'000;
     for (const InputReport::Image& image : generator.mixed(kFrames)) {
         timestampNs += 8'000'123;
         Frame frame;
         frame.timestamp = timestampNs;
-        frame.report = Testing::imageReport(image.signedPixels, image.frameNumber,
-                                            image.timestampMs, image.unsignedPixels);
-        frames.push_back(std::move(frame));
-    }
-    // As many settings as a session of somebody who tunes has.
-    std::size_t position = 0;
-    for (Frame& frame : frames) {
-        if (++position % 1000 == 0) {
+        // As many settings as a session of somebody who tunes has.
+        const std::size_t position = frames.size() + 1;
+        if (position % 1000 == 0) {
             frame.type = Frame::Type::State;
-            frame.report = {};
             frame.key = "Algs.ActivationThreshold";
             frame.value = 150.0 + static_cast<double>(position % 7000) / 100.0;
+        } else {
+            frame.report = Testing::imageReport(image.signedPixels, image.frameNumber,
+                                                image.timestampMs, image.unsignedPixels);
         }
+        frames.push_back(std::move(frame));
     }
     return frames;
 }
 
-const Frames& frames() {
-    static const Frames all = makeFrames();
+const FrameList& frames() {
+    static const FrameList all = makeFrames();
     return all;
 }
 
@@ -110,7 +104,7 @@ BENCHMARK(ContainerParseToNothing)->Unit(benchmark::kMillisecond);
 template <typename Load>
 void load(benchmark::State& state, Load&& read) {
     for ([[maybe_unused]] auto _ : state) {
-        Frames loaded = read();
+        auto loaded = read();
         benchmark::DoNotOptimize(&loaded);
         state.PauseTiming();
         if (loaded.size() != kFrames) {
@@ -177,7 +171,7 @@ BENCHMARK(RecordingToJson)->Unit(benchmark::kMillisecond);
 void RecordingTrim(benchmark::State& state) {
     for ([[maybe_unused]] auto _ : state) {
         state.PauseTiming();
-        Frames copy = frames();
+        FrameList copy = makeFrames();  // which shares nothing
         state.ResumeTiming();
         PipelineRecording::trimFrames(copy, kFrames / 2);
         benchmark::DoNotOptimize(&copy);
@@ -189,18 +183,42 @@ void RecordingTrim(benchmark::State& state) {
 }
 BENCHMARK(RecordingTrim)->Unit(benchmark::kMillisecond);
 
-void RecordingCopy(benchmark::State& state) {
-    const PipelineRecording recording(frames());
+/// Freeing the copies is not part of making them.
+template <typename Original>
+void copyOften(benchmark::State& state, const Original& original) {
+    constexpr std::size_t kCopies = 32;
+    std::vector<Original> copies;
+    copies.reserve(kCopies);
     for ([[maybe_unused]] auto _ : state) {
-        PipelineRecording copy = recording;
-        benchmark::DoNotOptimize(&copy);
-        state.PauseTiming();
-        copy = PipelineRecording();
-        state.ResumeTiming();
+        copies.push_back(original);
+        if (copies.size() == kCopies) {
+            state.PauseTiming();
+            copies.clear();
+            state.ResumeTiming();
+        }
     }
-    setRates(state, 0);
 }
-BENCHMARK(RecordingCopy)->Unit(benchmark::kMillisecond);
+
+/// As a host that asks for the recording makes the input thread wait. A capped recording at its
+/// fullest has 2,699 frames.
+void RecordingCopy(benchmark::State& state) {
+    const auto count = static_cast<std::size_t>(state.range(0));
+    PipelineRecording recording;
+    for (const Frame& frame : frames()) {
+        if (recording.frames().size() == count) {
+            break;
+        }
+        recording.appendFrame(frame);
+    }
+    copyOften(state, recording);
+}
+BENCHMARK(RecordingCopy)->Arg(0)->Arg(2'699)->Arg(kFrames);
+
+/// What of it is the algorithm's state.
+void AlgorithmCopy(benchmark::State& state) {
+    copyOften(state, Algs());
+}
+BENCHMARK(AlgorithmCopy);
 
 /// A clock that goes by the device's.
 class TickingClock final : public Vexa::HostClock {

@@ -11,7 +11,6 @@
 #include "Tools/RecordingRecovery.h"
 
 #include <cstdint>
-#include <list>
 #include <optional>
 #include <stdexcept>
 #include <string>
@@ -21,12 +20,11 @@ namespace {
 
 using namespace VexaTouch;
 using Fuzz::require;
-using Frames = std::list<PipelineRecording::Frame>;
 using Vexa::PropertyValue;
 
 /// Frames, or what was thrown: the text with a letter for its type.
 struct Answer {
-    Frames frames;
+    FrameList frames;
     std::string fault;
 
     friend bool operator==(const Answer&, const Answer&) = default;
@@ -61,7 +59,7 @@ Answer streamed(std::string_view text, std::size_t longest) {
 PipelineRecording::Frame frameFromValue(const PropertyValue& element) {
     PipelineRecording::Frame frame;
     const PropertyValue type = element.member("Type");
-    if (type.asString() == nullptr) {
+    if (!type.asString()) {
         throw std::invalid_argument("invalid frame type");
     }
     const PropertyValue timestamp = element.member("Timestamp");
@@ -72,17 +70,17 @@ PipelineRecording::Frame frameFromValue(const PropertyValue& element) {
     if (*type.asString() == "State") {
         frame.type = PipelineRecording::Frame::Type::State;
         const PropertyValue key = element.member("Key");
-        if (key.asString() == nullptr) {
+        if (!key.asString()) {
             throw std::invalid_argument("invalid state key");
         }
-        frame.key = *key.asString();
+        frame.key = std::string(*key.asString());
         frame.value = element.member("Value");
         if (!frame.value) {
             throw std::invalid_argument("invalid state value class");
         }
     } else if (*type.asString() == "InputReport") {
         const PropertyValue report = element.member("Report");
-        if (report.asString() == nullptr) {
+        if (!report.asString()) {
             throw std::invalid_argument("invalid report");
         }
         frame.report = Util::bytesFromHexString(*report.asString());
@@ -93,7 +91,7 @@ PipelineRecording::Frame frameFromValue(const PropertyValue& element) {
 }
 
 /// The long way: a tree of the whole text, its migration, its frames.
-Frames byValue(std::string_view text) {
+FrameList byValue(std::string_view text) {
     PropertyValue container;
     try {
         container = PipelineRecording::migrateSerializedContainer(Vexa::readJson(text));
@@ -101,17 +99,17 @@ Frames byValue(std::string_view text) {
         throw std::runtime_error(std::string("migrateSerializedContainer failed: ") + error.what());
     }
     const PropertyValue elements = container.member("Frames");
-    if (elements.asArray() == nullptr) {
+    if (!elements.asArray()) {
         throw std::invalid_argument("invalid frames");
     }
-    Frames frames;
-    for (const PropertyValue& element : *elements.asArray()) {
+    FrameList frames;
+    for (const PropertyValue element : *elements.asArray()) {
         frames.push_back(frameFromValue(element));
     }
     return frames;
 }
 
-std::string written(const Frames& frames) {
+std::string written(const FrameList& frames) {
     std::string text;
     ContainerWriter writer([&text](std::string_view piece) { text += piece; });
     for (const PipelineRecording::Frame& frame : frames) {

@@ -7,7 +7,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <list>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -17,10 +16,9 @@ namespace {
 using namespace VexaTouch;
 using Fuzz::require;
 using Tools::HidRecorderReader;
-using Frames = std::list<PipelineRecording::Frame>;
 
 struct Answer {
-    Frames frames;
+    FrameList frames;
     std::string fault;
 
     friend bool operator==(const Answer&, const Answer&) = default;
@@ -39,7 +37,7 @@ Answer read(std::string_view text, std::size_t longest) {
     }
 }
 
-std::string written(const Frames& frames) {
+std::string written(const FrameList& frames) {
     std::string text;
     Tools::HidRecorderWriter writer([&text](std::string_view piece) { text += piece; });
     for (const PipelineRecording::Frame& frame : frames) {
@@ -74,7 +72,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
         ++faults;
     });
     tolerant.write(text);
-    Frames kept;
+    FrameList kept;
     try {
         kept = tolerant.finish();
     } catch (const std::invalid_argument&) {

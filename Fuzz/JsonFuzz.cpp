@@ -27,14 +27,16 @@ PropertyValue readInPieces(std::string_view text, std::size_t longest) {
 
 /// What was read, as it reads back: an infinite number has no JSON form and becomes null.
 PropertyValue normalForm(const PropertyValue& value) {
-    if (const auto* array = value.asArray()) {
+    if (const auto array = value.asArray()) {
         PropertyValue::Array elements;
-        for (const PropertyValue& element : *array) elements.push_back(normalForm(element));
+        for (const PropertyValue element : *array) elements.push_back(normalForm(element));
         return elements;
     }
-    if (const auto* dictionary = value.asDictionary()) {
+    if (const auto dictionary = value.asDictionary()) {
         PropertyValue::Dictionary members;
-        for (const auto& [name, member] : *dictionary) members[name] = normalForm(member);
+        for (const auto [name, member] : *dictionary) {
+            members.emplace(name, normalForm(member));
+        }
         return members;
     }
     return std::isfinite(value.toDouble()) ? value : PropertyValue::null();

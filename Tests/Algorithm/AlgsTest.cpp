@@ -545,7 +545,7 @@ TEST(AlgsTest, EventsAreDigitizerEventsThatDifferInMaskPlaceAndPhase) {
         expected.transducerType = 2;
         expected.eventMask = mask;
         expected.y = y;
-        ASSERT_NE(event.digitizerRecord(), nullptr);
+        ASSERT_TRUE(event.digitizerRecord());
         EXPECT_EQ(*event.digitizerRecord(), expected) << event.description();
         EXPECT_EQ(event.phase(), phase);
         EXPECT_EQ(event.type(), Vexa::HidEventType::Digitizer);

@@ -259,7 +259,7 @@ TEST(EventStatsTest, TheDictionaryHoldsTwelveDispatchedAndTwelveRejectedNumbers)
               Vexa::PropertyValue(Dictionary{{"Dispatched", dispatched}, {"Rejected", rejected}}));
     for (const char* half : {"Dispatched", "Rejected"}) {
         const Vexa::PropertyValue counters = stats.statsDictionary().member(half);
-        for (const auto& [name, value] : *counters.asDictionary()) {
+        for (const auto [name, value] : *counters.asDictionary()) {
             EXPECT_EQ(value.type(), Vexa::PropertyValue::Type::Unsigned) << name;
         }
     }
@@ -270,7 +270,7 @@ TEST(EventStatsTest, AFreshDictionaryHoldsZeros) {
     const Vexa::PropertyValue stats = EventStats().statsDictionary();
     for (const char* half : {"Dispatched", "Rejected"}) {
         const Vexa::PropertyValue counters = stats.member(half);
-        for (const auto& [name, value] : *counters.asDictionary()) {
+        for (const auto [name, value] : *counters.asDictionary()) {
             EXPECT_EQ(value.toUnsigned64(), 0U) << name;
             ++zeros;
         }

@@ -13,7 +13,7 @@ namespace VexaTouch {
 namespace {
 
 using Bytes = std::vector<std::uint8_t>;
-using Frame = PipelineRecording::Frame;
+using Frame = RecordedFrame;
 
 const std::string kPlain = R"({"Type": "InputReport", "Timestamp": 7, "Report": "01 fF "})";
 

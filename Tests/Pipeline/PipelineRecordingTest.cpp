@@ -9,13 +9,17 @@
 
 #include <gmock/gmock.h>
 
+#include <atomic>
 #include <cstdint>
 #include <initializer_list>
 #include <limits>
 #include <list>
 #include <memory>
+#include <mutex>
+#include <optional>
 #include <stdexcept>
 #include <string>
+#include <thread>
 #include <utility>
 #include <vector>
 
@@ -118,7 +122,7 @@ TEST(RecordingTest, SharesTheValue) {
     Recorded recorded;
     const PropertyValue value = PropertyValue::Array{1, 2, 3};
     recorded.recording.setState("Key", value);
-    EXPECT_EQ(recorded.recording.frames().front().value.asArray(), value.asArray());
+    EXPECT_EQ(recorded.recording.frames().front().value.handle(), value.handle());
 }
 
 TEST(RecordingTest, KeepsReportsOfAnyLengthAndContent) {
@@ -227,13 +231,22 @@ struct TrimCase {
 
 class TrimTest : public ::testing::TestWithParam<TrimCase> {};
 
-TEST_P(TrimTest, Keeps) {
-    Frames frames = line(GetParam().before);
-    PipelineRecording::trimFrames(frames, GetParam().maxCount);
-    EXPECT_EQ(frames, line(GetParam().after));
+template <typename List>
+void expectTrimmed(const TrimCase& trim) {
+    List frames = line(trim.before);
+    PipelineRecording::trimFrames(frames, trim.maxCount);
+    EXPECT_EQ(frames, line(trim.after));
     // Trimming again finds nothing more.
-    PipelineRecording::trimFrames(frames, GetParam().maxCount);
-    EXPECT_EQ(frames, line(GetParam().after));
+    PipelineRecording::trimFrames(frames, trim.maxCount);
+    EXPECT_EQ(frames, line(trim.after));
+}
+
+TEST_P(TrimTest, Keeps) {
+    expectTrimmed<Frames>(GetParam());
+}
+
+TEST_P(TrimTest, KeepsTheSameOfABlockwiseList) {
+    expectTrimmed<FrameList>(GetParam());
 }
 
 const TrimCase kTrimCases[] = {
@@ -703,18 +716,18 @@ TEST(PlaybackTest, TheTrimOfWritingCanEndItToo) {
 
 // Copies.
 
-TEST(RecordingCopyTest, HasItsOwnFramesThatShareTheirValues) {
+TEST(RecordingCopyTest, IsARecordingOfItsOwn) {
     Recorded recorded;
     const PropertyValue value = PropertyValue::Array{1, 2};
     recorded.recording.setState("a", value);
     recorded.report({1});
     recorded.recording.setMaxFrameCount(1);
-    const Frames before = recorded.recording.frames();
     PipelineRecording copy = recorded.recording;
+    const Frames before = {stateFrame(recorded.clock.ticks, "a", value),
+                           reportFrame(recorded.clock.ticks, {1})};
     EXPECT_EQ(copy.frames(), before);
     EXPECT_EQ(copy.maxFrameCount(), 1U);
-    EXPECT_EQ(copy.frames().front().value.asArray(), value.asArray());
-    EXPECT_NE(&copy.frames().front(), &recorded.recording.frames().front());
+    EXPECT_EQ(copy.frames().front().value.handle(), value.handle());
     EXPECT_EQ(firstDifference(copy.algs(), recorded.recording.algs()), std::nullopt);
     EXPECT_EQ(copy.timeMach(), recorded.recording.timeMach());
     copy.setMaxFrameCount(0);
@@ -722,6 +735,128 @@ TEST(RecordingCopyTest, HasItsOwnFramesThatShareTheirValues) {
     EXPECT_EQ(copy.frames().size(), 3U);
     EXPECT_EQ(recorded.recording.frames(), before);
     EXPECT_EQ(recorded.recording.maxFrameCount(), 1U);
+}
+
+/// The times of a recording's frames.
+std::vector<std::uint64_t> timesOf(const PipelineRecording& recording) {
+    std::vector<std::uint64_t> times;
+    for (const Frame& frame : recording.frames()) {
+        times.push_back(frame.timestamp);
+    }
+    return times;
+}
+
+TEST(RecordingCopyTest, NeitherNoticesWhatBecomesOfTheOther) {
+    Recorded recorded;
+    recorded.recording.setMaxFrameCount(100);
+    for (int i = 0; i < 150; ++i) {
+        ++recorded.clock.ticks;
+        recorded.report({7});
+    }
+    const std::vector<std::uint64_t> before = timesOf(recorded.recording);
+    PipelineRecording copy = recorded.recording;
+    const PipelineRecording copyOfCopy = copy;
+    for (int i = 0; i < 49; ++i) {
+        ++recorded.clock.ticks;
+        recorded.report({8});
+    }
+    EXPECT_EQ(timesOf(copy), before);
+    ++recorded.clock.ticks;
+    recorded.report({8});  // trims
+    const std::vector<std::uint64_t> after = timesOf(recorded.recording);
+    EXPECT_EQ(after.size(), 100U);
+    EXPECT_EQ(after.back(), before.back() + 50);
+    EXPECT_EQ(timesOf(copy), before);
+    copy.setState("a", 1);
+    copy.setMaxFrameCount(3);
+    send(copy, {9});
+    EXPECT_EQ(copy.frames().size(), 5U);
+    EXPECT_EQ(copy.frames().back().report, Bytes{9});
+    EXPECT_EQ(timesOf(recorded.recording), after);
+    EXPECT_EQ(timesOf(copyOfCopy), before);
+}
+
+TEST(RecordingCopyTest, IsWrittenAsTheOriginalWas) {
+    Recorded recorded;
+    recorded.recording.setMaxFrameCount(100);
+    for (std::uint8_t i = 0; i < 199; ++i) {
+        if (i % 7 == 0) {
+            recorded.recording.setState("key " + std::to_string(i % 3), i);
+        } else {
+            recorded.report({i});
+        }
+    }
+    PipelineRecording copy = recorded.recording;
+    PipelineRecording copyOfCopy = copy;
+    const std::string text = recorded.recording.json();
+    recorded.report({1});
+    EXPECT_EQ(copyOfCopy.json(), text);
+    EXPECT_EQ(copy.json(), text);
+}
+
+/// A trim while a copy is held has to leave the shared frames, and the playback goes on all the
+/// same.
+TEST(RecordingCopyTest, DoesNotChangeHowATrimAffectsThePlayback) {
+    Playback playback(kFourReports);
+    playback.recording.playReset();
+    playback.recording.playNextFrame(1.0F);
+    playback.recording.playNextFrame(1.0F);
+    const PipelineRecording copy = playback.recording;
+    playback.recording.setMaxFrameCount(2);
+    EXPECT_TRUE(playback.recording.playCanContinue());
+    EXPECT_THAT(rest(playback.recording), ElementsAre(3, 4));
+    EXPECT_EQ(copy.frames(), kFourReports);
+}
+
+/// Run by the thread sanitizer as well.
+TEST(RecordingCopyTest, IsWrittenWhileTheOriginalIsRecordedOn) {
+    constexpr std::size_t kCap = 100;
+    constexpr int kCopies = 200;
+    FakeHostClock clock;
+    PipelineRecording recording(clock);
+    recording.setMaxFrameCount(kCap);
+    std::mutex mutex;  // guards the recording; held by the reader for its copy alone
+    std::atomic<bool> done = false;
+    std::thread reader([&] {
+        for (int i = 0; i < kCopies; ++i) {
+            std::optional<PipelineRecording> copy;
+            {
+                const std::scoped_lock lock(mutex);
+                copy.emplace(recording);
+            }
+            const PipelineRecording written(copy->json());
+            const std::vector<std::uint64_t> times = timesOf(written);
+            EXPECT_LE(times.size(), 2 * kCap);
+            for (std::size_t k = 1; k < times.size(); ++k) {
+                EXPECT_LE(times[k - 1], times[k]);
+            }
+            std::size_t reports = 0;
+            std::uint64_t number = 0;
+            for (const Frame& frame : written.frames()) {
+                if (frame.type == Frame::Type::InputReport) {
+                    // Every report, none missing between the oldest and the newest kept.
+                    const std::uint64_t own = frame.report.at(1) + 256U * frame.report.at(2);
+                    EXPECT_TRUE(reports == 0 || own == (number + 1) % 65'536) << own;
+                    number = own;
+                    ++reports;
+                }
+            }
+            EXPECT_LE(reports, kCap);
+        }
+        done = true;
+    });
+    std::uint64_t number = 0;
+    for (; !done || number < 10 * kCap; ++number) {
+        const std::scoped_lock lock(mutex);
+        ++clock.ticks;
+        if (number % 5 == 0) {
+            recording.setState("key " + std::to_string(number % 4), number);
+        }
+        send(recording, {7, static_cast<std::uint8_t>(number % 256),
+                         static_cast<std::uint8_t>(number / 256 % 256)});
+    }
+    reader.join();
+    EXPECT_EQ(recording.frames().back().timestamp, number);
 }
 
 TEST(RecordingCopyTest, WritingTheCopyTrimsOnlyTheCopy) {
@@ -759,8 +894,7 @@ TEST(RecordingCopyTest, OutlivesTheOriginal) {
     FakeHostClock clock;
     PipelineRecording copy(clock);
     copy = original->recording;
-    const Frames frames = copy.frames();
-    EXPECT_EQ(frames, kFourReports);
+    EXPECT_EQ(copy.frames(), kFourReports);
     copy = PipelineRecording(clock);
     original.reset();
     EXPECT_THAT(copy.frames(), IsEmpty());

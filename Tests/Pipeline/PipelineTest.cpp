@@ -188,7 +188,7 @@ TEST(PipelineTest, DebugInfoIsNoValueButTheAlgorithmsOwnIs) {
     WatchedPipeline watched;
     EXPECT_FALSE(watched.pipeline.getState("DebugInfo"));
     EXPECT_THAT(watched.lately(), ElementsAre("get DebugInfo"));
-    EXPECT_NE(watched.pipeline.getState("Algs.DebugInfo").asDictionary(), nullptr);
+    EXPECT_TRUE(watched.pipeline.getState("Algs.DebugInfo").asDictionary());
 }
 
 // Reports.
@@ -326,7 +326,7 @@ TEST(PipelineTest, AFirmwareResetAloneIsOneVendorEvent) {
                                               .version = 0,
                                               .payload = {},
                                               .options = 0};
-    ASSERT_NE(watched.events[0].vendorRecord(), nullptr);
+    ASSERT_TRUE(watched.events[0].vendorRecord());
     EXPECT_EQ(*watched.events[0].vendorRecord(), expected);
     EXPECT_EQ(watched.events[0].type(), Vexa::HidEventType::VendorDefined);
     EXPECT_EQ(watched.events[0].phase(), Vexa::HidEventPhase::None);

@@ -100,6 +100,23 @@ TEST(HidEventTest, AnUnknownFieldIsIgnored) {
     EXPECT_EQ(event.integerField(HidEventField::DigitizerFrameNumber), 0);
 }
 
+TEST(HidEventTest, ReferencesGoInAndOut) {
+    const std::int64_t before = vexa_live_objects(VEXA_OBJECT_EVENT);
+    {
+        const vexa_digitizer_record record{};
+        HidEvent event = HidEvent::adopt(vexa_event_create_digitizer(&record));
+        const HidEvent shared = HidEvent::share(event.handle());
+        EXPECT_EQ(shared, event);
+        vexa_event* const detached = event.detach();
+        EXPECT_EQ(event.handle(), nullptr);
+        EXPECT_EQ(detached, shared.handle());
+        vexa_event_set_phase(detached, VEXA_EVENT_PHASE_ENDED);
+        vexa_event_release(detached);
+        EXPECT_EQ(shared.phase(), HidEventPhase::Ended);
+    }
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_EVENT), before);
+}
+
 TEST(HidEventTest, EventsAreEqualWhenTheyAreTheSameObject) {
     const HidEvent event = HidEvent::digitizer({});
     const HidEvent copy = event;  // NOLINT(performance-unnecessary-copy-initialization)

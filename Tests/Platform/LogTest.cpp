@@ -4,6 +4,8 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <cerrno>
+#include <memory>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -17,6 +19,12 @@ using testing::IsEmpty;
 
 constexpr std::array kCategories = {LogCategory::HIDService, LogCategory::Pipeline,
                                     LogCategory::Recording, LogCategory::Algs};
+
+/// Any number as a code, as a caller in C may pass it.
+template <typename Code>
+Code coded(int number) {
+    return static_cast<Code>(number);
+}
 
 /// Collects messages, and leaves the process's log as it was.
 class LogTest : public testing::Test {
@@ -95,11 +103,84 @@ TEST_F(LogTest, ASinkMayLogAndReplaceItself) {
     EXPECT_THAT(lines, ElementsAre("first: own", "second: 2"));
 }
 
+TEST_F(LogTest, ASinkIsDestroyedWhenItIsReplaced) {
+    const auto life = std::make_shared<int>(0);
+    Log::setSink([life](LogCategory, LogLevel, std::string_view) {});
+    EXPECT_EQ(life.use_count(), 2);
+    Log::setSink([life](LogCategory, LogLevel, std::string_view) { Log::setSink({}); });
+    EXPECT_EQ(life.use_count(), 2);
+    Log(LogCategory::Algs).write(LogLevel::Error, "replaces its sink");
+    EXPECT_EQ(life.use_count(), 1);
+}
+
+TEST_F(LogTest, ASinkThatReplacesItselfTwiceLeavesTheLast) {
+    const auto life = std::make_shared<int>(0);
+    Log::setSink([this, life](LogCategory, LogLevel, std::string_view) {
+        Log::setSink([life](LogCategory, LogLevel, std::string_view) {});
+        Log::setSink([this, life](LogCategory, LogLevel, std::string_view message) {
+            lines.emplace_back(message);
+        });
+        EXPECT_EQ(life.use_count(), 3);  // ours, the running one's, the last one's
+    });
+    const Log log(LogCategory::Algs);
+    log.write(LogLevel::Error, "1");
+    EXPECT_EQ(life.use_count(), 2);
+    log.write(LogLevel::Error, "2");
+    EXPECT_THAT(lines, ElementsAre("2"));
+}
+
+TEST_F(LogTest, FlushingInASinkDoesNothing) {
+    Log::setSink([this](LogCategory, LogLevel, std::string_view message) {
+        Log::flush();
+        lines.emplace_back(message);
+    });
+    Log(LogCategory::Algs).write(LogLevel::Error, "m");
+    EXPECT_THAT(lines, ElementsAre("m"));
+}
+
+TEST_F(LogTest, AMessageEndsWithAZeroByteAndMayHoldSome) {
+    std::string seen;
+    vexa_log_set_sink(
+        [](void* context, vexa_log_category, vexa_log_level, const char* message, size_t length) {
+            static_cast<std::string*>(context)->assign(message, length + 1);
+        },
+        &seen, nullptr);
+    Log(LogCategory::Algs).write(LogLevel::Error, std::string_view("a\0bcd", 4));
+    EXPECT_EQ(seen, std::string("a\0bc\0", 5));
+}
+
+TEST_F(LogTest, LoggingKeepsTheErrorNumber) {
+    Log::setSink([](LogCategory, LogLevel, std::string_view) { errno = EBADF; });
+    errno = EPERM;
+    Log(LogCategory::Algs).write(LogLevel::Error, "m");
+    EXPECT_EQ(errno, EPERM);
+}
+
+TEST_F(LogTest, UnknownCodesAreNeverEnabled) {
+    const auto category = coded<vexa_log_category>(4);
+    vexa_log_set_level(category, VEXA_LOG_DEBUG);
+    EXPECT_EQ(vexa_log_get_level(category), VEXA_LOG_OFF);
+    EXPECT_FALSE(vexa_log_is_enabled(category, VEXA_LOG_ERROR));
+    vexa_log_write(category, VEXA_LOG_ERROR, "m", 1);
+    vexa_log_set_level(VEXA_LOG_ALGS, coded<vexa_log_level>(4));
+    EXPECT_EQ(vexa_log_get_level(VEXA_LOG_ALGS), VEXA_LOG_ERROR);
+    EXPECT_FALSE(vexa_log_is_enabled(VEXA_LOG_ALGS, coded<vexa_log_level>(4)));
+    vexa_log_write(VEXA_LOG_ALGS, coded<vexa_log_level>(-1), "m", 1);
+    EXPECT_THAT(lines, IsEmpty());
+}
+
+TEST_F(LogTest, ALevelReadsBack) {
+    Log::setLevel(LogCategory::Pipeline, LogLevel::Info);
+    EXPECT_EQ(Log::level(LogCategory::Pipeline), LogLevel::Info);
+    EXPECT_EQ(Log::level(LogCategory::Algs), LogLevel::Error);
+}
+
 TEST_F(LogTest, WithoutASinkALineGoesToStandardError) {
     Log::setSink({});
     testing::internal::CaptureStderr();
     Log(LogCategory::HIDService).write(LogLevel::Error, "disjoint image");
-    EXPECT_EQ(testing::internal::GetCapturedStderr(), "HIDService error: disjoint image\n");
+    EXPECT_THAT(testing::internal::GetCapturedStderr(),
+                testing::EndsWith(" HIDService error: disjoint image\n"));
 }
 
 TEST_F(LogTest, ThreadsLogOneAtATime) {

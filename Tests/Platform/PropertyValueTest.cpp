@@ -8,10 +8,14 @@
 #include <cstdint>
 #include <cstdlib>
 #include <limits>
+#include <optional>
 #include <ostream>
+#include <ranges>
+#include <stdexcept>
 #include <string>
 #include <string_view>
 #include <thread>
+#include <tuple>
 #include <utility>
 #include <vector>
 
@@ -19,8 +23,8 @@ namespace Vexa {
 namespace {
 
 using testing::ElementsAre;
+using testing::Optional;
 using testing::Pair;
-using testing::Pointee;
 using Type = PropertyValue::Type;
 
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
@@ -178,25 +182,147 @@ TEST(PropertyValueTest, ValuesOfDifferentTypesDiffer) {
 
 TEST(PropertyValueTest, ViewsShowOnlyTheirOwnType) {
     for (const PropertyValue& value : oneOfEach()) {
-        EXPECT_EQ(value.asSigned() != nullptr, value.type() == Type::Signed);
-        EXPECT_EQ(value.asUnsigned() != nullptr, value.type() == Type::Unsigned);
-        EXPECT_EQ(value.asString() != nullptr, value.type() == Type::String);
-        EXPECT_EQ(value.asBytes() != nullptr, value.type() == Type::Bytes);
-        EXPECT_EQ(value.asArray() != nullptr, value.type() == Type::Array);
-        EXPECT_EQ(value.asDictionary() != nullptr, value.type() == Type::Dictionary);
+        EXPECT_EQ(value.asSigned().has_value(), value.type() == Type::Signed);
+        EXPECT_EQ(value.asUnsigned().has_value(), value.type() == Type::Unsigned);
+        EXPECT_EQ(value.asString().has_value(), value.type() == Type::String);
+        EXPECT_EQ(value.asBytes().has_value(), value.type() == Type::Bytes);
+        EXPECT_EQ(value.asArray().has_value(), value.type() == Type::Array);
+        EXPECT_EQ(value.asDictionary().has_value(), value.type() == Type::Dictionary);
     }
 }
 
 TEST(PropertyValueTest, ViewsShowTheContent) {
-    EXPECT_THAT(PropertyValue(kSmallest).asSigned(), Pointee(kSmallest));
-    EXPECT_THAT(PropertyValue(kLargest).asUnsigned(), Pointee(kLargest));
-    EXPECT_THAT(PropertyValue(std::string("a\0b", 3)).asString(), Pointee(std::string("a\0b", 3)));
+    EXPECT_THAT(PropertyValue(kSmallest).asSigned(), Optional(kSmallest));
+    EXPECT_THAT(PropertyValue(kLargest).asUnsigned(), Optional(kLargest));
+    EXPECT_THAT(PropertyValue(std::string("a\0b", 3)).asString(),
+                Optional(std::string_view("a\0b", 3)));
     EXPECT_THAT(PropertyValue(PropertyValue::Bytes{0, 255}).asBytes(),
-                Pointee(ElementsAre(0, 255)));
+                Optional(ElementsAre(0, 255)));
     EXPECT_THAT(PropertyValue(PropertyValue::Array{1, "x"}).asArray(),
-                Pointee(ElementsAre(PropertyValue(1), PropertyValue("x"))));
+                Optional(ElementsAre(PropertyValue(1), PropertyValue("x"))));
     EXPECT_THAT(PropertyValue(PropertyValue::Dictionary{{"b", 2}, {"a", 1}}).asDictionary(),
-                Pointee(ElementsAre(Pair("a", PropertyValue(1)), Pair("b", PropertyValue(2)))));
+                Optional(ElementsAre(Pair("a", PropertyValue(1)), Pair("b", PropertyValue(2)))));
+}
+
+TEST(PropertyValueTest, TextAndKeysEndInAZeroByte) {
+    const PropertyValue value = PropertyValue::Dictionary{{"key", std::string("text")}};
+    const auto members = value.asDictionary();
+    EXPECT_STREQ(members->begin()->first.data(), "key");
+    EXPECT_STREQ(members->at("key").asString()->data(), "text");
+}
+
+TEST(PropertyValueTest, AnArrayIsReadByIndexAndFromEndToEnd) {
+    const PropertyValue value = PropertyValue::Array{1, PropertyValue(), "x"};
+    const PropertyValue::ArrayView view = *value.asArray();
+    EXPECT_EQ(view.size(), 3u);
+    EXPECT_FALSE(view.empty());
+    EXPECT_EQ(view[0], PropertyValue(1));
+    EXPECT_FALSE(view[1]);
+    EXPECT_EQ(view.at(2), PropertyValue("x"));
+    EXPECT_EQ(view.front(), PropertyValue(1));
+    EXPECT_EQ(view.back(), PropertyValue("x"));
+    EXPECT_FALSE(view[3]);
+    EXPECT_THROW(std::ignore = view.at(3), std::out_of_range);
+    EXPECT_EQ(view, (PropertyValue::Array{1, PropertyValue(), "x"}));
+    EXPECT_FALSE(view == (PropertyValue::Array{1, PropertyValue()}));
+    EXPECT_EQ(value.asArray(), PropertyValue(PropertyValue::Array{1, {}, "x"}).asArray());
+
+    const PropertyValue none = PropertyValue::Array{};
+    EXPECT_TRUE(none.asArray()->empty());
+    EXPECT_EQ(none.asArray()->begin(), none.asArray()->end());
+}
+
+TEST(PropertyValueTest, ADictionaryIsReadByKeyAndInTheOrderOfKeys) {
+    const PropertyValue value = PropertyValue::Dictionary{{"b", 2}, {"a", 1}};
+    const PropertyValue::DictionaryView view = *value.asDictionary();
+    EXPECT_EQ(view.size(), 2u);
+    EXPECT_FALSE(view.empty());
+    EXPECT_EQ(view.find("b")->second, PropertyValue(2));
+    EXPECT_EQ(view.find("c"), view.end());
+    EXPECT_EQ(view.at("a"), PropertyValue(1));
+    EXPECT_THROW(std::ignore = view.at("c"), std::out_of_range);
+    EXPECT_TRUE(view.contains("a"));
+    EXPECT_FALSE(view.contains(""));
+    EXPECT_EQ(view.count("b"), 1u);
+    EXPECT_EQ(view.count("c"), 0u);
+    EXPECT_EQ(view, (PropertyValue::Dictionary{{"a", 1}, {"b", 2}}));
+    EXPECT_FALSE(view == (PropertyValue::Dictionary{{"a", 1}, {"b", 3}}));
+    EXPECT_FALSE(view == (PropertyValue::Dictionary{{"a", 1}}));
+
+    std::string seen;
+    for (const auto [key, member] : *value.asDictionary()) {
+        seen.append(key).append(member.description());
+    }
+    EXPECT_EQ(seen, "a1b2");
+    EXPECT_TRUE(PropertyValue(PropertyValue::Dictionary{}).asDictionary()->empty());
+}
+
+TEST(PropertyValueTest, ViewsAreRandomAccessRanges) {
+    static_assert(std::ranges::random_access_range<PropertyValue::ArrayView>);
+    static_assert(std::ranges::random_access_range<PropertyValue::DictionaryView>);
+    const PropertyValue value = PropertyValue::Array{0, 1, 2, 3};
+    const PropertyValue::ArrayView view = *value.asArray();
+    auto it = view.begin();
+    EXPECT_EQ(*it++, PropertyValue(0));
+    EXPECT_EQ(*it, PropertyValue(1));
+    EXPECT_EQ(it[2], PropertyValue(3));
+    EXPECT_EQ(*(it += 2), PropertyValue(3));
+    EXPECT_EQ(*--it, PropertyValue(2));
+    EXPECT_EQ(*(it - 1), PropertyValue(1));
+    EXPECT_EQ(view.end() - view.begin(), 4);
+    EXPECT_LT(view.begin(), it);
+    EXPECT_EQ(PropertyValue::Array(view.begin(), view.end()), (PropertyValue::Array{0, 1, 2, 3}));
+}
+
+TEST(PropertyValueTest, AViewIsThereOrNot) {
+    const PropertyValue text = "text";
+    const PropertyValue one = 1;
+    EXPECT_EQ(text.asString(), "text");
+    EXPECT_FALSE(text.asString() == "other");
+    EXPECT_FALSE(text.asString() == std::nullopt);
+    EXPECT_EQ(text.asString().value(), "text");
+    EXPECT_EQ(one.asString(), std::nullopt);
+    EXPECT_FALSE(one.asString() == "");
+    EXPECT_EQ(one.asString().value_or("none"), "none");
+    EXPECT_THROW(std::ignore = one.asString().value(), std::bad_optional_access);
+    EXPECT_EQ(one.asString(), PropertyValue(2).asString());
+    EXPECT_FALSE(one.asString() == text.asString());
+}
+
+TEST(PropertyValueTest, ATemporaryViewIsGoneThroughSafely) {
+    const PropertyValue value = PropertyValue::Bytes{1, 2, 3};
+    int sum = 0;
+    for (const std::uint8_t byte : *value.asBytes()) sum += byte;
+    EXPECT_EQ(sum, 6);
+}
+
+TEST(PropertyValueTest, AnArrayTakesElementsOver) {
+    PropertyValue::Array elements{1, "x", PropertyValue()};
+    const vexa_value* const text = elements[1].handle();
+    const PropertyValue value = PropertyValue::arrayOf(elements);
+    EXPECT_EQ(elements, PropertyValue::Array(3));
+    EXPECT_EQ(value, PropertyValue(PropertyValue::Array{1, "x", PropertyValue()}));
+    EXPECT_EQ(value.asArray()->at(1).handle(), text);
+}
+
+TEST(PropertyValueTest, ReferencesGoInAndOut) {
+    const std::int64_t before = vexa_live_objects(VEXA_OBJECT_VALUE);
+    {
+        PropertyValue value = PropertyValue::adopt(vexa_value_create_string("text", 4));
+        const PropertyValue shared = PropertyValue::share(value.handle());
+        EXPECT_EQ(shared.handle(), value.handle());
+        vexa_value* const detached = value.detach();
+        EXPECT_FALSE(value);
+        EXPECT_EQ(value.handle(), nullptr);
+        EXPECT_EQ(detached, shared.handle());
+        vexa_value_release(detached);
+        EXPECT_EQ(shared, PropertyValue("text"));
+    }
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_VALUE), before);
+    EXPECT_FALSE(PropertyValue::adopt(nullptr));
+    EXPECT_FALSE(PropertyValue::share(nullptr));
+    EXPECT_EQ(PropertyValue().detach(), nullptr);
+    EXPECT_NE(PropertyValue::null().handle(), nullptr);
 }
 
 TEST(PropertyValueTest, TakesEveryArithmeticType) {
@@ -271,26 +397,27 @@ TEST(PropertyValueTest, ContainersCompareByTheirContent) {
 TEST(PropertyValueTest, CopiesShareTheContent) {
     const PropertyValue value = "shared";
     const PropertyValue copy = value;  // NOLINT(performance-unnecessary-copy-initialization)
-    EXPECT_EQ(copy.asString(), value.asString());
+    EXPECT_EQ(copy.handle(), value.handle());
     PropertyValue assigned = 1;
     assigned = value;
-    EXPECT_EQ(assigned.asString(), value.asString());
+    EXPECT_EQ(assigned.handle(), value.handle());
+    EXPECT_EQ(assigned.asString()->data(), value.asString()->data());
 }
 
 TEST(PropertyValueTest, ContentLivesAsLongAsAnyHandle) {
     PropertyValue first = "kept";
     PropertyValue second = first;
     first = 1;
-    EXPECT_THAT(second.asString(), Pointee(std::string("kept")));
+    EXPECT_THAT(second.asString(), Optional(std::string_view("kept")));
     PropertyValue third = std::move(second);
-    EXPECT_THAT(third.asString(), Pointee(std::string("kept")));
+    EXPECT_THAT(third.asString(), Optional(std::string_view("kept")));
 }
 
 TEST(PropertyValueTest, AssignsFromItselfAndFromItsOwnMember) {
     PropertyValue value = PropertyValue::Array{"inner"};
     const PropertyValue& alias = value;
     value = alias;
-    ASSERT_THAT(value.asArray(), Pointee(ElementsAre(PropertyValue("inner"))));
+    ASSERT_THAT(value.asArray(), Optional(ElementsAre(PropertyValue("inner"))));
     value = value.asArray()->front();
     EXPECT_EQ(value, PropertyValue("inner"));
 

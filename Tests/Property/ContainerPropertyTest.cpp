@@ -17,7 +17,6 @@
 #include <cstdlib>
 #include <iostream>
 #include <iterator>
-#include <list>
 #include <map>
 #include <optional>
 #include <random>
@@ -373,7 +372,7 @@ TEST(ContainerPropertyTest, RecoveryKeepsEveryWholeFrameOfAWrittenContainerCutOf
     SeededRandom random(seedOfThisRun());
     for (int i = 0; i < 30 && !HasFailure(); ++i) {
         const std::string text = writtenContainer(random);
-        const std::list<PipelineRecording::Frame> all = readByTree(text).frames;
+        const FrameList all = readByTree(text).frames;
         for (std::size_t length = 0; length <= text.size(); ++length) {
             const std::string_view cut = std::string_view(text).substr(0, length);
             // A frame ends where a bracket closes at a frame's indentation.

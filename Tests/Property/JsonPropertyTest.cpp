@@ -176,7 +176,7 @@ PropertyValue normalForm(const PropertyValue& value) {
             if (!std::isfinite(value.toDouble())) return PropertyValue::null();
             return value.toDouble();
         case Type::String:
-            return repaired(*value.asString());
+            return repaired(std::string(*value.asString()));
         case Type::Bytes: {
             std::string text;
             for (const std::uint8_t byte : *value.asBytes()) {
@@ -188,15 +188,15 @@ PropertyValue normalForm(const PropertyValue& value) {
         }
         case Type::Array: {
             PropertyValue::Array elements;
-            for (const PropertyValue& element : *value.asArray()) {
+            for (const PropertyValue element : *value.asArray()) {
                 elements.push_back(normalForm(element));
             }
             return elements;
         }
         case Type::Dictionary: {
             PropertyValue::Dictionary members;
-            for (const auto& [name, member] : *value.asDictionary()) {
-                members[name] = normalForm(member);
+            for (const auto [name, member] : *value.asDictionary()) {
+                members.emplace(name, normalForm(member));
             }
             return members;
         }

@@ -319,9 +319,13 @@ TEST(RecordingPropertyTest, TrimmingKeepsExactlyWhatTheRulesSay) {
     for (int i = 0; i < 20'000 && !HasFailure(); ++i) {
         const Frames before = anyLine(random);
         const auto maxCount = static_cast<std::size_t>(random.between(0, 12));
+        const Frames expected = trimmedSlowly(before, maxCount);
         Frames after = before;
         PipelineRecording::trimFrames(after, maxCount);
-        EXPECT_EQ(after, trimmedSlowly(before, maxCount)) << "cap " << maxCount;
+        EXPECT_EQ(after, expected) << "cap " << maxCount;
+        FrameList frames = before;
+        PipelineRecording::trimFrames(frames, maxCount);
+        EXPECT_EQ(frames, expected) << "cap " << maxCount;
         erased += before.size() - after.size();
     }
     EXPECT_GT(erased, 20'000U);
@@ -411,7 +415,7 @@ struct Replayed {
     PipelineRecording recording;
     Sent sent;
 
-    explicit Replayed(const Frames& frames, std::uint64_t now) : recording(frames, clock) {
+    explicit Replayed(const FrameList& frames, std::uint64_t now) : recording(frames, clock) {
         clock.ticks = now;
         sent.listenTo(recording, now);
         recording.playReset();

@@ -137,7 +137,7 @@ void addEvents(Hash& hash, const std::vector<Vexa::HidEvent>& events) {
         hash.add(static_cast<std::uint64_t>(event.phase()));
         hash.add(static_cast<std::uint64_t>(
             event.integerField(Vexa::HidEventField::DigitizerFrameNumber)));
-        if (const Vexa::DigitizerEventRecord* record = event.digitizerRecord()) {
+        if (const auto record = event.digitizerRecord()) {
             hash.add(record->eventMask);
             hash.add(std::bit_cast<std::uint64_t>(record->y));
         }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "Pipeline/ContainerReader.h"
+#include "Pipeline/FrameList.h"
 #include "Pipeline/PipelineRecording.h"
 #include "Platform/Json.h"
 #include "Platform/PropertyValue.h"
@@ -8,7 +9,6 @@
 
 #include <cstdint>
 #include <exception>
-#include <list>
 #include <ostream>
 #include <sstream>
 #include <stdexcept>
@@ -22,7 +22,7 @@ namespace VexaTouch::Testing {
 
 /// Frames, or the exact type and text of the exception.
 struct ContainerAnswer {
-    std::list<PipelineRecording::Frame> frames = {};
+    FrameList frames = {};
     std::string fault = {};
 
     friend bool operator==(const ContainerAnswer&, const ContainerAnswer&) = default;
@@ -93,7 +93,7 @@ inline std::vector<std::uint8_t> literalBytesFromHexString(const std::string& te
 
 inline PipelineRecording::Frame frameOfTree(const Vexa::PropertyValue& element) {
     const Vexa::PropertyValue type = element.member("Type");
-    if (type.asString() == nullptr) {
+    if (!type.asString()) {
         throw std::invalid_argument("invalid frame type");
     }
     const Vexa::PropertyValue timestamp = element.member("Timestamp");
@@ -102,21 +102,22 @@ inline PipelineRecording::Frame frameOfTree(const Vexa::PropertyValue& element) 
     }
     if (*type.asString() == "State") {
         const Vexa::PropertyValue key = element.member("Key");
-        if (key.asString() == nullptr) {
+        if (!key.asString()) {
             throw std::invalid_argument("invalid state key");
         }
         const Vexa::PropertyValue value = element.member("Value");
         if (!value) {
             throw std::invalid_argument("invalid state value class");
         }
-        return stateFrame(timestamp.toUnsigned64(), *key.asString(), value);
+        return stateFrame(timestamp.toUnsigned64(), std::string(*key.asString()), value);
     }
     if (*type.asString() == "InputReport") {
         const Vexa::PropertyValue report = element.member("Report");
-        if (report.asString() == nullptr) {
+        if (!report.asString()) {
             throw std::invalid_argument("invalid report");
         }
-        return reportFrame(timestamp.toUnsigned64(), literalBytesFromHexString(*report.asString()));
+        return reportFrame(timestamp.toUnsigned64(),
+                           literalBytesFromHexString(std::string(*report.asString())));
     }
     throw std::invalid_argument("invalid frame type");
 }
@@ -132,11 +133,11 @@ inline ContainerAnswer readByTree(std::string_view text) {
                                      error.what());
         }
         const Vexa::PropertyValue elements = container.member("Frames");
-        if (elements.asArray() == nullptr) {
+        if (!elements.asArray()) {
             throw std::invalid_argument("invalid frames");
         }
-        std::list<PipelineRecording::Frame> frames;
-        for (const Vexa::PropertyValue& element : *elements.asArray()) {
+        FrameList frames;
+        for (const Vexa::PropertyValue element : *elements.asArray()) {
             frames.push_back(frameOfTree(element));
         }
         return frames;

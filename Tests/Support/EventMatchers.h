@@ -43,17 +43,17 @@ public:
             return false;
         }
         if (isFirmwareReset()) {
-            const Vexa::VendorEventRecord* record = event.vendorRecord();
+            const auto record = event.vendorRecord();
             Vexa::VendorEventRecord expected;
             expected.timestamp = event.timestamp();
             expected.usagePage = 0xFF60;
             expected.usage = 2;
-            return record != nullptr && *record == expected;
+            return record == expected;
         }
-        const Vexa::DigitizerEventRecord* record = event.digitizerRecord();
+        const auto record = event.digitizerRecord();
         Vexa::DigitizerEventRecord expected = record_;
         expected.timestamp = event.timestamp();
-        return record != nullptr && *record == expected;
+        return record == expected;
     }
     void DescribeTo(std::ostream* out) const {
         *out << "is " << name_;

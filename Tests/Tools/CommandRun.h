@@ -12,7 +12,6 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
-#include <list>
 #include <ostream>
 #include <regex>
 #include <sstream>
@@ -115,7 +114,7 @@ inline std::vector<std::string> linesOf(const std::string& text) {
 }
 
 /// The text of a container with these frames.
-inline std::string containerText(const std::list<PipelineRecording::Frame>& frames) {
+inline std::string containerText(const FrameList& frames) {
     std::string text;
     ContainerWriter writer([&text](std::string_view piece) { text += piece; });
     for (const PipelineRecording::Frame& frame : frames) {

@@ -11,7 +11,6 @@
 #include <algorithm>
 #include <iterator>
 #include <limits>
-#include <list>
 #include <string>
 #include <utility>
 #include <vector>

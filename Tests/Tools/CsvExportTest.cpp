@@ -14,7 +14,7 @@ namespace {
 
 using namespace VexaTouch::Testing;
 
-std::string csvOf(const std::list<PipelineRecording::Frame>& frames) {
+std::string csvOf(const FrameList& frames) {
     std::string text;
     CsvExport writer([&text](std::string_view piece) { text += piece; });
     Replay replay(frames);

@@ -53,7 +53,7 @@ std::vector<std::string> namesWith(std::string_view extension) {
 
 struct Container {
     std::uint32_t version = 0;
-    std::list<PipelineRecording::Frame> frames;
+    FrameList frames;
 };
 
 Container containerOf(const std::string& text) {

@@ -10,7 +10,6 @@
 
 #include <cstdint>
 #include <limits>
-#include <list>
 #include <map>
 #include <string>
 #include <vector>
@@ -50,7 +49,7 @@ Frame state(std::uint64_t timestamp, std::string key, PropertyValue value) {
             .report = {}};
 }
 
-std::string written(const std::list<Frame>& frames) {
+std::string written(const FrameList& frames) {
     std::string text;
     HidRecorderWriter writer([&](std::string_view piece) { text += piece; });
     for (const Frame& frame : frames) {
@@ -60,7 +59,7 @@ std::string written(const std::list<Frame>& frames) {
     return text;
 }
 
-std::list<Frame> read(std::string_view text) {
+FrameList read(std::string_view text) {
     HidRecorderReader reader;
     reader.write(text);
     return reader.finish();
@@ -75,8 +74,8 @@ std::string faultOf(std::string_view text) {
     return "(none)";
 }
 
-const std::list<Frame>& everything() {
-    static const std::list<Frame> frames = {
+const FrameList& everything() {
+    static const FrameList frames = {
         state(999, "Algs.ActivationThreshold", 200.0),
         report(1'000'000'000, {2, 0, 1, 2, 3, 4, 5, 6, 7, 8}),
         report(1'000'000'001, {0xFF}),
@@ -190,10 +189,10 @@ TEST(HidRecorder, ReadsBackWhatItWrote) {
 }
 
 TEST(HidRecorder, ValuesComeBackWithTheirTypes) {
-    const std::list<Frame> values = {state(1, "k", 200.0), state(1, "k", 200), state(1, "k", true),
-                                     state(1, "k", "200"), state(1, "k", -1),  state(1, "k", 0.1),
-                                     state(1, "k", -0.0)};
-    const std::list<Frame> back = read(written(values));
+    const FrameList values = {state(1, "k", 200.0), state(1, "k", 200), state(1, "k", true),
+                              state(1, "k", "200"), state(1, "k", -1),  state(1, "k", 0.1),
+                              state(1, "k", -0.0)};
+    const FrameList back = read(written(values));
     EXPECT_EQ(back, values);
     std::vector<PropertyValue::Type> types;
     for (const Frame& frame : back) {
@@ -232,11 +231,11 @@ TEST(HidRecorder, ReadsWhatTheHidToolsWrite) {
         "\r\n"
         "X: nobody knows\r\n"
         "E: 000012.345678 1 00";
-    EXPECT_EQ(read(text), (std::list<Frame>{report(0, {2, 10, 255}), report(12'345'678'000, {0})}));
+    EXPECT_EQ(read(text), (FrameList{report(0, {2, 10, 255}), report(12'345'678'000, {0})}));
 }
 
 TEST(HidRecorder, AnEventWithoutBytesIsAnEmptyReport) {
-    EXPECT_EQ(read("E: 000001.000000 0\n"), (std::list<Frame>{report(1'000'000'000, {})}));
+    EXPECT_EQ(read("E: 000001.000000 0\n"), (FrameList{report(1'000'000'000, {})}));
 }
 
 TEST(HidRecorder, OnlyTheFirstDeviceIsRead) {
@@ -245,7 +244,7 @@ TEST(HidRecorder, OnlyTheFirstDeviceIsRead) {
         "D: 3\nN: ours\nD: 4\nN: other\n"
         "D: 3\nE: 000000.000000 1 01\nD: 4\nE: 000000.000001 1 02\nE: 000000.000002 1 03\n"
         "D: 3\nE: 000000.000003 1 04\n");
-    EXPECT_EQ(reader.finish(), (std::list<Frame>{report(0, {1}), report(3000, {4})}));
+    EXPECT_EQ(reader.finish(), (FrameList{report(0, {1}), report(3000, {4})}));
     EXPECT_EQ(reader.otherDevicesEvents(), 2U);
 }
 
@@ -322,7 +321,7 @@ TEST(HidRecorder, WithAHandlerFaultyLinesAreLeftOut) {
     reader.write(
         "E: 000000.000001 1 01\n# vexatouch: nanoseconds 5\nE: 000000.000002 2 01\n"
         "E: 000000.000003 1 03\nE: 0000");
-    EXPECT_EQ(reader.finish(), (std::list<Frame>{report(1000, {1}), report(3000, {3})}));
+    EXPECT_EQ(reader.finish(), (FrameList{report(1000, {1}), report(3000, {3})}));
     EXPECT_THAT(faults, ElementsAre("3 an event of 2 bytes has 1",
                                     "5 time '0000' is not seconds.microseconds"));
 }
@@ -333,7 +332,7 @@ TEST(HidRecorder, ACutTextGivesItsWholeFrames) {
     for (std::size_t length = kHeader.size(); length <= kEverythingText.size(); ++length) {
         HidRecorderReader reader([](std::uint64_t, std::string_view) {});
         reader.write(std::string_view(kEverythingText).substr(0, length));
-        const std::list<Frame> frames = reader.finish();
+        const FrameList frames = reader.finish();
         ASSERT_LE(frames.size(), everything().size());
         ASSERT_TRUE(std::equal(frames.begin(), frames.end(), everything().begin()))
             << "cut at " << length;

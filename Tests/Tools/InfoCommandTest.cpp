@@ -18,7 +18,7 @@ struct Image {
 
 /// A recording of images that feel nothing, 10 ms of host time apart.
 std::string imagesText(const std::vector<Image>& images) {
-    std::list<PipelineRecording::Frame> frames;
+    FrameList frames;
     std::uint64_t timeNs = 1'000'000'000;
     for (const Image& image : images) {
         frames.push_back({.timestamp = timeNs,

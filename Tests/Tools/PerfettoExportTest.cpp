@@ -17,7 +17,7 @@ namespace {
 
 using namespace VexaTouch::Testing;
 
-std::string traceOf(const std::list<PipelineRecording::Frame>& frames) {
+std::string traceOf(const FrameList& frames) {
     std::string text;
     PerfettoExport writer([&text](std::string_view piece) { text += piece; });
     Replay replay(frames);
@@ -43,7 +43,7 @@ const std::string kBegin =
 ,{"ph":"M","pid":1,"name":"thread_sort_index","tid":5,"args":{"sort_index":5}})";
 
 // The trace's events behind the names of its tracks, a line each.
-std::string eventsOf(const std::list<PipelineRecording::Frame>& frames) {
+std::string eventsOf(const FrameList& frames) {
     const std::string text = traceOf(frames);
     const std::string end = "]}\n";
     EXPECT_EQ(text.substr(0, kBegin.size()), kBegin);
@@ -136,9 +136,9 @@ TEST(PerfettoExport, SlicesAreBalancedWhereverARecordingEnds) {
         std::map<double, int> open;
         double now = 0;
         const Vexa::PropertyValue events = trace.member("traceEvents");
-        ASSERT_NE(events.asArray(), nullptr);
-        for (const Vexa::PropertyValue& event : *events.asArray()) {
-            const std::string phase = *event.member("ph").asString();
+        ASSERT_TRUE(events.asArray());
+        for (const Vexa::PropertyValue event : *events.asArray()) {
+            const std::string phase(*event.member("ph").asString());
             if (phase == "M") {
                 continue;
             }

@@ -25,6 +25,9 @@ using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::StartsWith;
+using Vexa::Log;
+using Vexa::LogCategory;
+using Vexa::LogLevel;
 using Vexa::PropertyValue;
 
 constexpr const char* kMixedTable =
@@ -273,21 +276,51 @@ TEST_F(ReplayCommandTest, ARecordingWithoutFramesIsAFailure) {
     expectFailure(none, none + ": holds no frame to replay");
 }
 
+/// What goes past the command's streams to the process's standard error, with the command's result.
+template <typename Call>
+std::string loggedDuring(const Call& call) {
+    testing::internal::CaptureStderr();
+    call();
+    return testing::internal::GetCapturedStderr();
+}
+
 TEST_F(ReplayCommandTest, LogMessagesGoToStandardErrorAndStopAfterwards) {
-    const CommandResult result = replay({session, "--log", "Algs=debug", "--log", "Pipeline=off"});
+    CommandResult result;
+    EXPECT_THAT(loggedDuring([&] {
+                    result = replay({session, "--log", "Algs=debug", "--log", "Pipeline=off"});
+                }),
+                HasSubstr(" Algs debug: Frame 6 @10050ms, *** Event Stats ***\n"));
     EXPECT_EQ(result.out, kMixedTable);
-    EXPECT_THAT(result.error, HasSubstr("[Algs] debug: Frame 6 @10050ms, *** Event Stats ***\n"));
-    EXPECT_FALSE(Vexa::Log(Vexa::LogCategory::Algs).isEnabled(Vexa::LogLevel::Debug));
-    EXPECT_EQ(replay({session}).error, summary(session, kMixedCounts));
+    EXPECT_EQ(result.error, summary(session, kMixedCounts));
+    EXPECT_EQ(loggedDuring([&] { result = replay({session}); }), "");
+}
+
+TEST_F(ReplayCommandTest, LogLevelsWinOverThoseOfTheEnvironmentWhileTheCommandRuns) {
+    const std::array categories = {LogCategory::HIDService, LogCategory::Pipeline,
+                                   LogCategory::Recording, LogCategory::Algs};
+    for (const LogCategory category : categories) {
+        Log::setLevel(category, LogLevel::Debug);
+    }
+    EXPECT_THAT(loggedDuring([&] { replay({session}); }), HasSubstr(" Algs debug: "));
+    EXPECT_EQ(loggedDuring([&] { replay({session, "--log", "Algs=info"}); }), "");
+    EXPECT_EQ(loggedDuring([&] { replay({session, "--log", "off"}); }), "");
+    EXPECT_THAT(loggedDuring([&] { replay({session, "--log", "off", "--log", "Algs=debug"}); }),
+                HasSubstr(" Algs debug: "));
+    EXPECT_EQ(loggedDuring([&] { replay({session, "--log", "Algs=debug", "--log", "OFF"}); }), "");
+    for (const LogCategory category : categories) {
+        EXPECT_EQ(Log::level(category), LogLevel::Debug);
+        Log::setLevel(category, LogLevel::Error);
+    }
 }
 
 TEST_F(ReplayCommandTest, LogLevelsThatDoNotExistAreUsageErrors) {
-    for (const std::string text : {"Algs", "Algs=loud", "Fingers=debug", "=", ""}) {
+    for (const std::string text : {"Algs", "Algs=loud", "Fingers=debug", "=", "=debug", ""}) {
         EXPECT_EQ(replay({session, "--log", text}),
                   (CommandResult{2, "",
                                  "vexatouch replay: --log " + text +
-                                     ": CATEGORY=LEVEL is needed; CATEGORY is one of HIDService "
-                                     "Pipeline Recording Algs, LEVEL one of debug info error off\n"
+                                     ": LEVEL or CATEGORY=LEVEL is needed; CATEGORY is one of "
+                                     "HIDService Pipeline Recording Algs, LEVEL one of debug info "
+                                     "error off\n"
                                      "Try 'vexatouch replay --help'.\n"}));
     }
 }
@@ -305,13 +338,13 @@ std::vector<PropertyValue> traceOf(const std::string& text) {
 
 std::vector<std::string> memberNames(const PropertyValue& object) {
     std::vector<std::string> names;
-    for (const auto& [name, value] : *object.asDictionary()) {
-        names.push_back(name);
+    for (const auto [name, value] : *object.asDictionary()) {
+        names.emplace_back(name);
     }
     return names;
 }
 
-const PropertyValue& element(const PropertyValue& array, std::size_t index) {
+PropertyValue element(const PropertyValue& array, std::size_t index) {
     return array.asArray()->at(index);
 }
 

@@ -2,6 +2,7 @@
 #include "Tests/Support/FakeHostClock.h"
 #include "Tests/Support/Touch.h"
 #include "Tests/Tools/CommandRun.h"
+#include "Tests/Tools/ProgramOnTerminal.h"
 #include "Tests/Tools/RecordedSession.h"
 #include "Tools/TerminalColor.h"
 
@@ -464,75 +465,6 @@ TEST(ShowCommand, BadInputIsNamed) {
                              .error = "vexatouch show: standard input: holds no frame to show\n"}));
     EXPECT_EQ(runCommand({"show", "-"}, "").exitCode, 1);
 }
-
-/// The program on a terminal of its own.
-class ProgramOnTerminal {
-public:
-    explicit ProgramOnTerminal(const std::vector<std::string>& arguments) {
-        const winsize size{.ws_row = 30, .ws_col = 80, .ws_xpixel = 0, .ws_ypixel = 0};
-        process_ = forkpty(&terminal_, nullptr, nullptr, &size);
-        if (process_ == 0) {
-            std::vector<char*> pointers = {const_cast<char*>(VEXATOUCH_PROGRAM)};
-            for (const std::string& argument : arguments) {
-                pointers.push_back(const_cast<char*>(argument.c_str()));
-            }
-            pointers.push_back(nullptr);
-            // A test run in the background was started with interrupts ignored.
-            std::signal(SIGINT, SIG_DFL);
-            execv(VEXATOUCH_PROGRAM, pointers.data());
-            _exit(127);
-        }
-    }
-    ~ProgramOnTerminal() {
-        if (process_ > 0) {
-            kill(process_, SIGKILL);
-            waitpid(process_, nullptr, 0);
-        }
-        close(terminal_);
-    }
-    ProgramOnTerminal(const ProgramOnTerminal&) = delete;
-    ProgramOnTerminal& operator=(const ProgramOnTerminal&) = delete;
-
-    /// Reads until the program has written this text once more; false when it ends before.
-    bool readUntil(const std::string& text) {
-        std::size_t from = read_.size();
-        while (read_.find(text, from) == std::string::npos) {
-            char piece[4096];
-            const ssize_t got = read(terminal_, piece, sizeof piece);
-            if (got <= 0) {
-                return false;
-            }
-            read_.append(piece, static_cast<std::size_t>(got));
-        }
-        return true;
-    }
-
-    void type(std::string_view keys) const {
-        ASSERT_EQ(write(terminal_, keys.data(), keys.size()), static_cast<ssize_t>(keys.size()));
-    }
-
-    /// Waits for the end and gives the status as waitpid does.
-    int end() {
-        readUntil("\xFF");
-        int status = 0;
-        waitpid(process_, &status, 0);
-        process_ = -1;
-        return status;
-    }
-
-    /// Whether keys are again read by the line and echoed.
-    [[nodiscard]] bool keyboardIsAsBefore() const {
-        constexpr tcflag_t kUsual = ICANON | ECHO;
-        termios now{};
-        return tcgetattr(terminal_, &now) == 0 && (now.c_lflag & kUsual) == kUsual;
-    }
-    [[nodiscard]] const std::string& output() const { return read_; }
-
-private:
-    pid_t process_ = -1;
-    int terminal_ = -1;
-    std::string read_;
-};
 
 /// An hour of nothing.
 std::string longRecording(const TemporaryFolder& folder) {

@@ -23,7 +23,7 @@ using testing::Ge;
 using testing::IsEmpty;
 using testing::Le;
 
-std::list<Frame> framesOf(std::string_view script, std::optional<std::uint64_t> seed = {}) {
+FrameList framesOf(std::string_view script, std::optional<std::uint64_t> seed = {}) {
     return synthesize(GestureScript::parse(script), seed);
 }
 
@@ -61,7 +61,7 @@ std::vector<std::string> eventsOf(std::string_view script) {
 }
 
 /// FNV-1a over everything in the frames.
-std::uint64_t hashOf(const std::list<Frame>& frames) {
+std::uint64_t hashOf(const FrameList& frames) {
     std::uint64_t hash = 0xCBF29CE484222325U;
     const auto add = [&hash](std::uint64_t byte) { hash = (hash ^ byte) * 0x100000001B3U; };
     for (const Frame& frame : frames) {
