@@ -5,9 +5,11 @@ set(CMAKE_CXX_EXTENSIONS OFF)
 if(NOT DEFINED CMAKE_CXX_COMPILER_LAUNCHER)
     find_program(VEXA_CCACHE ccache)
     if(VEXA_CCACHE)
-        # Without the build folder in the key, presets with equal flags share what they compile.
+        # Without the folders in the key, presets with equal flags share what they compile, and so
+        # do checkouts.
         set(CMAKE_CXX_COMPILER_LAUNCHER "${CMAKE_COMMAND}" -E env CCACHE_NOHASHDIR=1
-                                        "${VEXA_CCACHE}")
+                                        "CCACHE_BASEDIR=${PROJECT_SOURCE_DIR}" "${VEXA_CCACHE}")
+        set(CMAKE_C_COMPILER_LAUNCHER ${CMAKE_CXX_COMPILER_LAUNCHER})
     endif()
 endif()
 

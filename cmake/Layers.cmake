@@ -48,3 +48,17 @@ function(vexa_layer_includes layer)
         target_include_directories(${layer} PUBLIC ${ARGN})
     endif()
 endfunction()
+
+# vexa_define(<target> <name> <value>): a macro with the text, for those of the target's sources that
+# mention it. The others are compiled alike in every checkout, which the compiler cache makes use of.
+function(vexa_define target name value)
+    get_target_property(sources ${target} SOURCES)
+    foreach(source IN LISTS sources)
+        file(REAL_PATH "${source}" path BASE_DIRECTORY "${CMAKE_CURRENT_SOURCE_DIR}")
+        file(STRINGS "${path}" mentions REGEX "${name}" LIMIT_COUNT 1)
+        if(mentions)
+            set_property(SOURCE "${source}" APPEND PROPERTY COMPILE_DEFINITIONS
+                         "${name}=\"${value}\"")
+        endif()
+    endforeach()
+endfunction()

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "Tests/Tools/VexatouchProgram.h"
+
 #include <gtest/gtest.h>
 #include <pty.h>
 #include <sys/ioctl.h>
@@ -23,14 +25,14 @@ public:
         const winsize size{.ws_row = 30, .ws_col = 80, .ws_xpixel = 0, .ws_ypixel = 0};
         process_ = forkpty(&terminal_, nullptr, nullptr, &size);
         if (process_ == 0) {
-            std::vector<char*> pointers = {const_cast<char*>(VEXATOUCH_PROGRAM)};
+            std::vector<char*> pointers = {const_cast<char*>(vexatouchProgram())};
             for (const std::string& argument : arguments) {
                 pointers.push_back(const_cast<char*>(argument.c_str()));
             }
             pointers.push_back(nullptr);
             // A test run in the background was started with interrupts ignored.
             std::signal(SIGINT, SIG_DFL);
-            execv(VEXATOUCH_PROGRAM, pointers.data());
+            execv(vexatouchProgram(), pointers.data());
             _exit(127);
         }
     }

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "Tests/Tools/VexatouchProgram.h"
+
 #include <fcntl.h>
 #include <sched.h>
 #include <sys/ioctl.h>
@@ -28,7 +30,7 @@ public:
             throw std::runtime_error("no pipes");
         }
         fcntl(out[0], F_SETPIPE_SZ, kPipeBytes);
-        std::vector<char*> pointers = {const_cast<char*>(VEXATOUCH_PROGRAM)};
+        std::vector<char*> pointers = {const_cast<char*>(vexatouchProgram())};
         for (const std::string& argument : arguments) {
             pointers.push_back(const_cast<char*>(argument.c_str()));
         }
@@ -39,7 +41,7 @@ public:
             dup2(error[1], STDERR_FILENO);
             // A test run in the background was started with interrupts ignored.
             std::signal(SIGINT, SIG_DFL);
-            execv(VEXATOUCH_PROGRAM, pointers.data());
+            execv(vexatouchProgram(), pointers.data());
             _exit(127);
         }
         close(out[1]);
