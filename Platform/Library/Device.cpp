@@ -23,6 +23,14 @@ bool setNonBlocking(int descriptor) noexcept {
            ((flags & O_NONBLOCK) != 0 || ::fcntl(descriptor, F_SETFL, flags | O_NONBLOCK) == 0);
 }
 
+// Whether it can be waited for at all, which a regular file cannot. Asked in a set made for the
+// purpose, since the device may not be on a loop yet. Without a descriptor left for it: no.
+bool canBeWatched(int descriptor) noexcept {
+    const FileDescriptor set(::epoll_create1(EPOLL_CLOEXEC));
+    epoll_event nothing{};
+    return set && ::epoll_ctl(set.number(), EPOLL_CTL_ADD, descriptor, &nothing) == 0;
+}
+
 // Of these each read gives one whole packet, and one of 0 bytes is a packet too.
 bool isPacketSocket(int descriptor) noexcept {
     int type = 0;
@@ -121,10 +129,11 @@ vexa_status vexa_device::openBackend(std::uint32_t options, FileDescriptor& desc
     const vexa_status status = backend_->open(options, number);
     if (status != VEXA_STATUS_SUCCESS) return status;
     descriptor = FileDescriptor(number);
-    if (descriptor && setNonBlocking(descriptor.number())) return VEXA_STATUS_SUCCESS;
+    const bool isOne = descriptor && setNonBlocking(descriptor.number());
+    if (isOne && canBeWatched(descriptor.number())) return VEXA_STATUS_SUCCESS;
     descriptor = FileDescriptor();
     backend_->close(options);
-    return VEXA_STATUS_IO_ERROR;
+    return isOne ? VEXA_STATUS_NO_RESOURCES : VEXA_STATUS_IO_ERROR;
 }
 
 vexa_status vexa_device::close(std::uint32_t options) noexcept {

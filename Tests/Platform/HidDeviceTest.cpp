@@ -934,14 +934,53 @@ TEST(BareBackend, ThatOpensWhatCannotBeWatchedIsClosedAgain) {
         EXPECT_EQ(bare.closes, 1);
         EXPECT_EQ(::fcntl(bare.descriptor, F_GETFL), -1);
         device.unschedule(RunLoop::current(), kMode);
-        // Open first, it is the schedule that fails, and then nothing is scheduled.
-        bare.descriptor = ::open(VEXA_SOURCE_DIR "/CMakeLists.txt", O_RDONLY | O_CLOEXEC);
+    }).join();
+    vexa_service_unregister(service);
+}
+
+TEST(BareBackend, ThatOpensWhatCannotBeWatchedIsClosedAgainBeforeAnybodyWaits) {
+    Bare bare;
+    vexa_device_backend table = Bare::table();
+    table.close = &Bare::close;
+    const std::uint32_t service = vexa_service_register(&table, &bare);
+    const HidDevice device = HidDevice::create(service);
+    bare.descriptor = ::open(VEXA_SOURCE_DIR "/CMakeLists.txt", O_RDONLY | O_CLOEXEC);
+    EXPECT_EQ(device.open(0), VEXA_STATUS_NO_RESOURCES);
+    EXPECT_EQ(bare.closes, 1);
+    EXPECT_EQ(::fcntl(bare.descriptor, F_GETFL), -1);
+    EXPECT_EQ(vexa_device_close(device.get(), 0), VEXA_STATUS_NOT_OPEN);
+    std::array<int, 2> ends{};
+    ASSERT_EQ(::pipe2(ends.data(), O_CLOEXEC), 0);
+    bare.descriptor = ends[0];
+    EXPECT_EQ(device.open(0), VEXA_STATUS_SUCCESS);
+    device.close(0);
+    EXPECT_EQ(bare.closes, 2);
+    ::close(ends[1]);
+    vexa_service_unregister(service);
+}
+
+TEST(BareBackend, WhoseDescriptorTurnsUnwatchableCannotBeScheduled) {
+    Bare bare;
+    const vexa_device_backend table = Bare::table();
+    const std::uint32_t service = vexa_service_register(&table, &bare);
+    const HidDevice device = HidDevice::create(service);
+    std::array<int, 2> ends{};
+    ASSERT_EQ(::pipe2(ends.data(), O_CLOEXEC), 0);
+    bare.descriptor = ends[0];
+    std::jthread([&] {
+        Reader reader;
+        reader.registerWith(device);
         EXPECT_EQ(device.open(0), VEXA_STATUS_SUCCESS);
+        const int file = ::open(VEXA_SOURCE_DIR "/CMakeLists.txt", O_RDONLY | O_CLOEXEC);
+        ASSERT_EQ(::dup3(file, ends[0], O_CLOEXEC), ends[0]);
+        ::close(file);
         EXPECT_EQ(device.schedule(RunLoop::current(), kMode), VEXA_STATUS_NO_RESOURCES);
+        // Nothing is scheduled then.
         device.close(0);
         EXPECT_EQ(device.schedule(RunLoop::current(), kMode), VEXA_STATUS_SUCCESS);
         device.unschedule(RunLoop::current(), kMode);
     }).join();
+    ::close(ends[1]);
     vexa_service_unregister(service);
 }
 

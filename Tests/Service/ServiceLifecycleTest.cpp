@@ -1,6 +1,5 @@
 #include "Platform/DeviceBackend.h"
 #include "Platform/HidDevice.h"
-#include "Platform/RunLoop.h"
 #include "Tests/Support/LeakCheck.h"
 #include "Tests/Support/LiveObjects.h"
 #include "Tests/Support/LogCapture.h"
@@ -14,7 +13,6 @@
 
 #include <fcntl.h>
 #include <array>
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
@@ -440,17 +438,9 @@ INSTANTIATE_TEST_SUITE_P(
     faultName);
 
 /// The statuses behind the service's answers, of another device of the same back-end.
-void expectAnswers(const Answers& answers, std::uint32_t handle, const Vexa::RunLoop& loop) {
+void expectAnswers(const Answers& answers, std::uint32_t handle) {
     const Vexa::HidDevice device = Vexa::HidDevice::create(handle);
     ASSERT_TRUE(device);
-    // Only who waits for reports finds out that a descriptor cannot be waited for.
-    std::array<std::uint8_t, 8> buffer{};
-    device.setInputReportCallback(
-        buffer,
-        [](void*, vexa_status, vexa_device*, vexa_report_type, std::uint32_t, const std::uint8_t*,
-           std::size_t, std::uint64_t) {},
-        nullptr);
-    EXPECT_EQ(device.schedule(loop, "fault"), VEXA_STATUS_SUCCESS);
     if (answers.open != VEXA_STATUS_SUCCESS) {
         EXPECT_EQ(device.open(0), answers.open);
     }
@@ -459,20 +449,6 @@ void expectAnswers(const Answers& answers, std::uint32_t handle, const Vexa::Run
     EXPECT_EQ(device.featureReport(4, report.data(), length), answers.report);
     EXPECT_EQ(static_cast<bool>(device.property("Product")), answers.reads);
     EXPECT_EQ(device.setProperty("Colour", 1), answers.writes);
-    device.unschedule(loop, "fault");
-}
-
-/// Opens the service's device. A descriptor that cannot be waited for is found out only once the
-/// input thread waits, so that is tried for up to a minute.
-bool opens(const ServiceUnderTest& service, vexa_status expected) {
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::minutes(1);
-    while (service.open()) {
-        if (expected != VEXA_STATUS_NO_RESOURCES) return true;
-        if (std::chrono::steady_clock::now() > deadline) return true;
-        service.close();
-        std::this_thread::yield();
-    }
-    return false;
 }
 
 /// Takes a service through its whole life; `strike` is called before one step, and what the host
@@ -498,7 +474,7 @@ void liveThrough(Step when, const Answers& struck, const LoadedPlugin& plugin, S
     comesTo(Step::Schedule);
     service.schedule(queue);
     comesTo(Step::Open);
-    const bool opened = opens(service, now.open);
+    const bool opened = service.open();
     EXPECT_EQ(opened, now.open == VEXA_STATUS_SUCCESS);
     comesTo(Step::Properties);
     const bool arrives = opened && now.reads;
@@ -530,7 +506,6 @@ TEST_P(FaultTest, EndsInTheDocumentedAnswers) {
     const Strike strike = std::get<Strike>(GetParam());
     const Step step = std::get<Step>(GetParam());
     const LoadedPlugin plugin(VEXATOUCH_PLUGIN_FILE);
-    const Vexa::RunLoop loop = Vexa::RunLoop::current();
     const LeakCheck leaks;
     {
         const auto device = std::make_shared<StruckDevice>();
@@ -542,7 +517,7 @@ TEST_P(FaultTest, EndsInTheDocumentedAnswers) {
         liveThrough(step, answersAfter(strike), plugin, *device, registration.service(), queue,
                     events, [&] {
                         device->strike(strike);
-                        expectAnswers(answersAfter(strike), registration.service(), loop);
+                        expectAnswers(answersAfter(strike), registration.service());
                     });
         EXPECT_EQ(device->leftOpen(), 0);
     }
