@@ -12,8 +12,8 @@
 #include <new>
 #include <utility>
 
+using Vexa::MutexLock;
 using Vexa::Library::FileDescriptor;
-using Vexa::Library::MutexLock;
 
 namespace {
 

@@ -2,9 +2,9 @@
 
 #include "Platform/Library/FileDescriptor.h"
 #include "Platform/Library/LiveObjects.h"
-#include "Platform/Library/Mutex.h"
 #include "Platform/Library/RunLoop.h"
 #include "Platform/Library/ServiceRegistry.h"
+#include "Platform/Mutex.h"
 
 #include <vexa/device.h>
 #include <atomic>
@@ -69,7 +69,7 @@ private:
     std::atomic<bool> present_{true};
     const std::shared_ptr<const Vexa::Library::Backend> backend_;
 
-    Vexa::Library::Mutex mutex_;
+    Vexa::Mutex mutex_;
     State state_ GUARDED_BY(mutex_) = State::Closed;
     Vexa::Library::FileDescriptor descriptor_ GUARDED_BY(mutex_);
     bool isPacketSocket_ GUARDED_BY(mutex_) = false;

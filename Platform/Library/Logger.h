@@ -3,7 +3,7 @@
 #include "Platform/Library/Journal.h"
 #include "Platform/Library/LogMessage.h"
 #include "Platform/Library/LogRing.h"
-#include "Platform/Library/Mutex.h"
+#include "Platform/Mutex.h"
 
 #include <pthread.h>
 #include <semaphore.h>

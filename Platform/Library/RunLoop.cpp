@@ -15,8 +15,8 @@
 #include <string_view>
 #include <utility>
 
+using Vexa::MutexLock;
 using Vexa::Library::FileDescriptor;
-using Vexa::Library::MutexLock;
 
 namespace {
 

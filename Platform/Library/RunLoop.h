@@ -2,7 +2,7 @@
 
 #include "Platform/Library/FileDescriptor.h"
 #include "Platform/Library/LiveObjects.h"
-#include "Platform/Library/Mutex.h"
+#include "Platform/Mutex.h"
 
 #include <vexa/run_loop.h>
 #include <atomic>
@@ -94,7 +94,7 @@ private:
     // Between a write to wake_ and the read that takes it.
     std::atomic<bool> signalled_{false};
 
-    Vexa::Library::Mutex mutex_;
+    Vexa::Mutex mutex_;
     std::map<std::string, std::unique_ptr<Mode>, std::less<>> modes_ GUARDED_BY(mutex_);
     Run* innermost_ GUARDED_BY(mutex_) = nullptr;
     std::uint64_t lastWatch_ GUARDED_BY(mutex_) = 0;

@@ -1,6 +1,6 @@
 #include "Platform/Library/ServiceRegistry.h"
 
-#include "Platform/Library/Mutex.h"
+#include "Platform/Mutex.h"
 
 #include <algorithm>
 #include <cstddef>
