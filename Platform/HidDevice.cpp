@@ -35,12 +35,12 @@ bool HidDevice::setProperty(const PropertyValue& key, const PropertyValue& value
     return handle_ && vexa_device_set_property(handle_.get(), key.handle(), value.handle());
 }
 
-void HidDevice::setInputReportCallback(std::span<std::uint8_t> buffer,
-                                       vexa_input_report_callback callback,
-                                       void* context) const noexcept {
-    if (!handle_) return;
-    vexa_device_set_input_report_callback(handle_.get(), buffer.data(), buffer.size(), callback,
-                                          context);
+vexa_status HidDevice::setInputReportCallback(std::span<std::uint8_t> buffer,
+                                              vexa_input_report_callback callback,
+                                              void* context) const noexcept {
+    if (!handle_) return VEXA_STATUS_NOT_OPEN;
+    return vexa_device_set_input_report_callback(handle_.get(), buffer.data(), buffer.size(),
+                                                 callback, context);
 }
 
 vexa_status HidDevice::schedule(const RunLoop& loop, const char* mode) const noexcept {

@@ -33,9 +33,11 @@ public:
     // NOLINTNEXTLINE(modernize-use-nodiscard): a write that nobody checks is fine
     bool setProperty(const PropertyValue& key, const PropertyValue& value) const noexcept;
 
-    /// On the thread of the run loop. A null callback ends it.
-    void setInputReportCallback(std::span<std::uint8_t> buffer, vexa_input_report_callback callback,
-                                void* context) const noexcept;
+    /// On the thread of the run loop. A null callback ends it; another one is refused before that.
+    // NOLINTNEXTLINE(modernize-use-nodiscard): who ends it, or is the only one, need not look
+    vexa_status setInputReportCallback(std::span<std::uint8_t> buffer,
+                                       vexa_input_report_callback callback,
+                                       void* context) const noexcept;
     vexa_status schedule(const RunLoop& loop, const char* mode) const noexcept;
     void unschedule(const RunLoop& loop, const char* mode) const noexcept;
 

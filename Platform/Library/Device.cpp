@@ -176,10 +176,12 @@ bool vexa_device::setProperty(const vexa_value* key, const vexa_value* value) no
     return key && present_ && backend_->setProperty(key, value);
 }
 
-void vexa_device::setInputReportCallback(std::uint8_t* buffer, std::size_t length,
-                                         vexa_input_report_callback callback,
-                                         void* context) noexcept {
+vexa_status vexa_device::setInputReportCallback(std::uint8_t* buffer, std::size_t length,
+                                                vexa_input_report_callback callback,
+                                                void* context) noexcept {
     const MutexLock lock(mutex_);
+    // It may be another thread's, in the middle of a report.
+    if (callback && target_.callback) return VEXA_STATUS_BAD_ARGUMENT;
     target_ = {
         .buffer = buffer, .length = buffer ? length : 0, .callback = callback, .context = context};
     if (!callback) {
@@ -188,6 +190,7 @@ void vexa_device::setInputReportCallback(std::uint8_t* buffer, std::size_t lengt
         // Without memory the reports wait until the next occasion.
         static_cast<void>(watch());
     }
+    return VEXA_STATUS_SUCCESS;
 }
 
 vexa_status vexa_device::schedule(vexa_run_loop* loop, const char* mode) noexcept {
@@ -308,10 +311,11 @@ bool vexa_device_set_property(vexa_device* device, const vexa_value* key,
     return device->setProperty(key, value);
 }
 
-void vexa_device_set_input_report_callback(vexa_device* device, uint8_t* buffer, size_t length,
-                                           vexa_input_report_callback callback,
-                                           void* context) noexcept {
-    device->setInputReportCallback(buffer, length, callback, context);
+vexa_status vexa_device_set_input_report_callback(vexa_device* device, uint8_t* buffer,
+                                                  size_t length,
+                                                  vexa_input_report_callback callback,
+                                                  void* context) noexcept {
+    return device->setInputReportCallback(buffer, length, callback, context);
 }
 
 vexa_status vexa_device_schedule(vexa_device* device, vexa_run_loop* loop,

@@ -34,8 +34,8 @@ public:
     vexa_value* copyProperty(const vexa_value* key) noexcept;
     bool setProperty(const vexa_value* key, const vexa_value* value) noexcept;
 
-    void setInputReportCallback(std::uint8_t* buffer, std::size_t length,
-                                vexa_input_report_callback callback, void* context) noexcept;
+    vexa_status setInputReportCallback(std::uint8_t* buffer, std::size_t length,
+                                       vexa_input_report_callback callback, void* context) noexcept;
     vexa_status schedule(vexa_run_loop* loop, const char* mode) noexcept;
     void unschedule(vexa_run_loop* loop, const char* mode) noexcept;
 

@@ -51,8 +51,8 @@ class Reader {
 public:
     explicit Reader(std::size_t room = 512) : buffer_(room) {}
 
-    void registerWith(const HidDevice& device) {
-        device.setInputReportCallback(buffer_, &Reader::receive, this);
+    vexa_status registerWith(const HidDevice& device) {
+        return device.setInputReportCallback(buffer_, &Reader::receive, this);
     }
     void unregisterFrom(const HidDevice& device) {
         device.setInputReportCallback(buffer_, nullptr, nullptr);
@@ -350,7 +350,7 @@ TEST_F(HidDeviceTest, KeepsReportsUntilThereIsACallback) {
     input.call([&] { device_.unschedule(input.loop(), kMode); });
 }
 
-TEST_F(HidDeviceTest, ChangesTheCallbackInPlace) {
+TEST_F(HidDeviceTest, RefusesASecondCallbackUntilTheFirstIsTakenBack) {
     const LoopThread input;
     Reader first;
     Reader second;
@@ -361,11 +361,17 @@ TEST_F(HidDeviceTest, ChangesTheCallbackInPlace) {
     device_.open(0);
     scripted_->sendReport(Bytes{1});
     ASSERT_TRUE(scripted_->waitUntilHandled(1));
-    input.call([&] { second.registerWith(device_); });
+    EXPECT_EQ(second.registerWith(device_), VEXA_STATUS_BAD_ARGUMENT);
     scripted_->sendReport(Bytes{2});
     ASSERT_TRUE(scripted_->waitUntilHandled(2));
-    EXPECT_THAT(first.reports(), ElementsAre(Bytes{1}));
-    EXPECT_THAT(second.reports(), ElementsAre(Bytes{2}));
+    input.call([&] {
+        first.unregisterFrom(device_);
+        EXPECT_EQ(second.registerWith(device_), VEXA_STATUS_SUCCESS);
+    });
+    scripted_->sendReport(Bytes{3});
+    ASSERT_TRUE(scripted_->waitUntilHandled(3));
+    EXPECT_THAT(first.reports(), ElementsAre(Bytes{1}, Bytes{2}));
+    EXPECT_THAT(second.reports(), ElementsAre(Bytes{3}));
     input.call([&] { device_.unschedule(input.loop(), kMode); });
 }
 

@@ -108,11 +108,12 @@ VEXA_API bool vexa_device_set_property(vexa_device* device, const vexa_value* ke
 /* [loop, or while the device is not scheduled] Where reports go: each is read into `buffer` (room
  * for `length` bytes, owned by the caller, a longer report is cut) and `callback` is called. A NULL
  * callback ends it: afterwards neither buffer nor context is touched. An empty buffer cuts all
- * reports to nothing. */
-VEXA_API void vexa_device_set_input_report_callback(vexa_device* device, uint8_t* buffer,
-                                                    size_t length,
-                                                    vexa_input_report_callback callback,
-                                                    void* context) VEXA_NOEXCEPT;
+ * reports to nothing. 0, or VEXA_STATUS_BAD_ARGUMENT for a second callback while there is one: that
+ * has to be ended first, by whoever set it. */
+VEXA_API vexa_status vexa_device_set_input_report_callback(vexa_device* device, uint8_t* buffer,
+                                                           size_t length,
+                                                           vexa_input_report_callback callback,
+                                                           void* context) VEXA_NOEXCEPT;
 
 /* [loop] Reports are read while this loop runs in this mode and the device is open, whichever came
  * first; without a callback they wait. Each costs one system call to wait and one to read it, no
