@@ -24,6 +24,14 @@ public:
             demand(errno == EINTR);
         }
     }
+    /// Takes a signal if one is there.
+    [[nodiscard]] bool tryWait() noexcept {
+        while (sem_trywait(&semaphore_) != 0) {
+            if (errno == EAGAIN) return false;
+            demand(errno == EINTR);
+        }
+        return true;
+    }
 
 private:
     // Only misuse makes these calls fail.

@@ -60,7 +60,7 @@ public:
     void setEventCallback(vexa_event_callback callback, void* target, void* refcon) override;
     /// Starts the input thread and returns once its run loop is there. When the thread or its loop
     /// cannot be made it logs why and returns all the same; unscheduling then only lets the queue
-    /// go.
+    /// go (and ends the thread of an earlier scheduling, if there is one).
     ///
     /// Scheduling a second time without unscheduling starts a second thread and leaves the first
     /// one beyond reach: it runs and keeps the service alive until the process ends. Its device
@@ -102,9 +102,12 @@ private:
     template <typename Report>
     std::optional<Report> featureReport() const noexcept;
 
+    /// 0, or the error number that says why there is no thread.
+    int startInputThread();
+
     // The input thread.
     void runInputThread(InputReportRun& run) noexcept;
-    void handleInputReports(InputReportRun& run) EXCLUDES(_pipelineLock);
+    void handleInputReports(InputReportRun& run, const Vexa::RunLoop& loop) EXCLUDES(_pipelineLock);
     void installProbes(InputReportRun& run) REQUIRES(_pipelineLock);
     void clearProbes() REQUIRES(_pipelineLock);
     void handleInputReport(vexa_report_type type, std::uint8_t reportId, const std::uint8_t* report,

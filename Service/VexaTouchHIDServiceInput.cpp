@@ -7,10 +7,12 @@
 
 #include <pthread.h>
 #include <array>
+#include <cerrno>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <functional>
+#include <new>
 #include <string>
 #include <system_error>
 #include <thread>
@@ -83,6 +85,29 @@ void demand(bool holds, const char* what) noexcept {
     std::abort();
 }
 
+/// The loop of the calling thread, its mode ready to be waited in; none without descriptors or
+/// memory for either.
+Vexa::RunLoop runLoopOfThisThread() noexcept {
+    try {
+        Vexa::RunLoop loop = Vexa::RunLoop::current();
+        if (loop.run(kRunLoopMode, 0) != VEXA_RUN_FAILED) return loop;
+    } catch (const std::bad_alloc&) {
+        return {};
+    }
+    return {};
+}
+
+/// Has the loop end its innermost run in the mode, now or as soon as there is one. False when the
+/// loop's thread has ended or there is no memory.
+bool submitStop(const Vexa::RunLoop& loop) noexcept {
+    try {
+        return loop.submit(kRunLoopMode,
+                           []() noexcept { vexa_run_loop_stop(vexa_run_loop_current()); });
+    } catch (const std::bad_alloc&) {
+        return false;
+    }
+}
+
 }  // namespace
 
 /// What one run of the input thread works with, all fixed before the thread starts: the host may
@@ -101,21 +126,34 @@ void VexaTouchHIDService::scheduleWithDispatchQueue(const Vexa::SerialQueue& que
     logOperation("scheduleWithDispatchQueue:");
     _dispatchEventContext.queue = queue;
     _dispatchEventContext.sender = getServiceInterface();
-    _inputReportThreadSignal = std::make_shared<CountingSemaphore>();
-    InputReportRun run{ServiceReference<VexaTouchHIDService>::share(this), _vexaDevice,
-                       _dispatchEventContext, _inputReportThreadSignal, std::nullopt};
+    const Vexa::RunLoop loopBefore = _inputReportRunLoop;
+    std::shared_ptr<CountingSemaphore> signalBefore = _inputReportThreadSignal;
+    const int error = startInputThread();
+    if (error == 0) {
+        _inputReportThreadSignal->wait();
+    } else {
+        logFormat(_log, Vexa::LogLevel::Error, "input report thread not started: %d", error);
+    }
+    // A thread that did not get as far as its run loop gives no second signal. What can be
+    // unscheduled is then still the thread before it, if there is one.
+    if (_inputReportRunLoop == loopBefore) _inputReportThreadSignal = std::move(signalBefore);
+}
+
+int VexaTouchHIDService::startInputThread() {
     try {
+        _inputReportThreadSignal = std::make_shared<CountingSemaphore>();
+        InputReportRun run{ServiceReference<VexaTouchHIDService>::share(this), _vexaDevice,
+                           _dispatchEventContext, _inputReportThreadSignal, std::nullopt};
         const SignalsBlocked blocked;
         std::thread([run = std::move(run)]() mutable noexcept {
             run.service.get()->runInputThread(run);
         }).detach();
+        return 0;
     } catch (const std::system_error& error) {
-        logFormat(_log, Vexa::LogLevel::Error, "input report thread not started: %d",
-                  error.code().value());
-        _inputReportThreadSignal.reset();
-        return;
+        return error.code().value();
+    } catch (const std::bad_alloc&) {
+        return ENOMEM;
     }
-    _inputReportThreadSignal->wait();
 }
 
 void VexaTouchHIDService::unscheduleWithDispatchQueue(const Vexa::SerialQueue&) {
@@ -129,15 +167,18 @@ void VexaTouchHIDService::unscheduleWithDispatchQueue(const Vexa::SerialQueue&) 
 #endif
     if (_inputReportRunLoop) {
         _log.write(Vexa::LogLevel::Debug, "signalling input report thread to exit");
-        const bool submitted = _inputReportRunLoop.submit(
-            kRunLoopMode, []() noexcept { vexa_run_loop_stop(vexa_run_loop_current()); });
-        // Only without memory: the thread would never end and the wait below neither.
-        demand(submitted,
-               "unscheduleWithDispatchQueue: the input report thread cannot be told to stop");
+        const bool submitted = submitStop(_inputReportRunLoop);
         _inputReportRunLoop.wake();
         _inputReportRunLoop.reset();
         _log.write(Vexa::LogLevel::Debug, "waiting for input report thread to exit");
-        _inputReportThreadSignal->wait();
+        if (submitted) {
+            _inputReportThreadSignal->wait();
+        } else {
+            // The thread has ended by itself, after its last signal, because its loop could not
+            // run. Without memory for the task it would never end, and the wait neither.
+            demand(_inputReportThreadSignal->tryWait(),
+                   "unscheduleWithDispatchQueue: the input report thread cannot be told to stop");
+        }
         _inputReportThreadSignal.reset();
         _log.write(Vexa::LogLevel::Debug, "input report thread exited");
     }
@@ -153,17 +194,17 @@ void VexaTouchHIDService::runInputThread(InputReportRun& run) noexcept {
     const std::shared_ptr<CountingSemaphore> signal = run.signal;
 
     log.write(Vexa::LogLevel::Debug, "input report thread start");
-    try {
-        _inputReportRunLoop = Vexa::RunLoop::current();
-    } catch (const std::bad_alloc&) {
-        // Without descriptors, or memory, there is no run loop: the service stays unscheduled.
+    const Vexa::RunLoop loop = runLoopOfThisThread();
+    if (!loop) {
+        // The service stays unscheduled.
         log.write(Vexa::LogLevel::Error, "input report thread has no run loop");
         run = {};
         signal->signal();
         return;
     }
+    _inputReportRunLoop = loop;
     signal->signal();
-    handleInputReports(run);
+    handleInputReports(run, loop);
     // Before the last signal, so that who unschedules owns what is left, this object included.
     inputThreadOf = nullptr;
     run = {};
@@ -171,7 +212,7 @@ void VexaTouchHIDService::runInputThread(InputReportRun& run) noexcept {
     log.write(Vexa::LogLevel::Debug, "input report thread end");
 }
 
-void VexaTouchHIDService::handleInputReports(InputReportRun& run) {
+void VexaTouchHIDService::handleInputReports(InputReportRun& run, const Vexa::RunLoop& loop) {
     if (const int error = raisePriority(); error != 0) {
         logFormat(_log, Vexa::LogLevel::Error, "pthread_setschedparam failed: %d", error);
     }
@@ -185,17 +226,18 @@ void VexaTouchHIDService::handleInputReports(InputReportRun& run) {
         installProbes(run);
     }
     std::array<std::uint8_t, kReportBufferSize> buffer{};
-    const Vexa::RunLoop loop = Vexa::RunLoop::current();
-    // Reports wait until there is a callback. The device of a service that was scheduled twice is
-    // still the first thread's, and so are its buffer and its handler.
-    const vexa_status status = run.device.schedule(loop, kRunLoopMode);
-    if (status == VEXA_STATUS_SUCCESS) {
-        run.device.setInputReportCallback(buffer, &inputReportArrived, &handler);
-    } else if (run.device) {
+    // Refused when the service was scheduled twice: the device is still the first thread's, and
+    // with it the callback, which this thread must then not take back either.
+    vexa_status status = run.device.setInputReportCallback(buffer, &inputReportArrived, &handler);
+    const bool registered = status == VEXA_STATUS_SUCCESS;
+    if (registered) status = run.device.schedule(loop, kRunLoopMode);
+    if (status != VEXA_STATUS_SUCCESS && run.device) {
         logFormat(_log, Vexa::LogLevel::Error, "device not scheduled: %jx", std::uintmax_t{status});
     }
-    loop.run(kRunLoopMode);
-    if (status == VEXA_STATUS_SUCCESS) {
+    if (loop.run(kRunLoopMode) == VEXA_RUN_FAILED) {
+        _log.write(Vexa::LogLevel::Error, "input report run loop failed");
+    }
+    if (registered) {
         run.device.unschedule(loop, kRunLoopMode);
         run.device.setInputReportCallback(buffer, nullptr, nullptr);
     }

@@ -48,6 +48,9 @@ namespace {
 std::atomic<bool> abiServes{true};
 std::atomic<std::uint32_t> askedFor{0};
 std::atomic<bool> haveRunLoops{true};
+/// Whether loops can make a mode to wait in, and wait in it for ever.
+std::atomic<bool> loopsHaveModes{true};
+std::atomic<bool> loopsWait{true};
 std::atomic<int> priorityError{0};
 std::atomic<int> policy{-1};
 std::atomic<int> priority{-1};
@@ -122,6 +125,14 @@ VEXA_API vexa_run_loop* vexa_run_loop_current(void) noexcept {
     return haveRunLoops ? current() : nullptr;
 }
 
+VEXA_API vexa_run_result vexa_run_loop_run(vexa_run_loop* loop, const char* mode,
+                                           uint64_t timeout_ns, bool return_after_source) noexcept {
+    static const auto run =
+        original<vexa_run_result(vexa_run_loop*, const char*, uint64_t, bool)>("vexa_run_loop_run");
+    if (!loopsHaveModes || (timeout_ns == VEXA_RUN_FOREVER && !loopsWait)) return VEXA_RUN_FAILED;
+    return run(loop, mode, timeout_ns, return_after_source);
+}
+
 VEXA_API int pthread_setschedparam(pthread_t thread, int newPolicy,
                                    const sched_param* parameters) noexcept {
     raised = thread;
@@ -164,18 +175,18 @@ VEXA_API void vexa_device_unschedule(vexa_device* device, vexa_run_loop* loop,
     unschedule(device, loop, mode);
 }
 
-VEXA_API void vexa_device_set_input_report_callback(vexa_device* device, uint8_t* buffer,
-                                                    size_t length,
-                                                    vexa_input_report_callback callback,
-                                                    void* context) noexcept {
+VEXA_API vexa_status vexa_device_set_input_report_callback(vexa_device* device, uint8_t* buffer,
+                                                           size_t length,
+                                                           vexa_input_report_callback callback,
+                                                           void* context) noexcept {
     static const auto set =
-        original<void(vexa_device*, uint8_t*, size_t, vexa_input_report_callback, void*)>(
+        original<vexa_status(vexa_device*, uint8_t*, size_t, vexa_input_report_callback, void*)>(
             "vexa_device_set_input_report_callback");
     deviceCalls.add({.name = "setInputReportCallback",
                      .buffer = buffer,
                      .length = length,
                      .hasCallback = callback != nullptr});
-    set(device, buffer, length, callback, context);
+    return set(device, buffer, length, callback, context);
 }
 
 #if VEXA_COUNTS_SIGNALS
@@ -306,18 +317,104 @@ TEST(ServiceSeamsTest, AThreadWithoutARunLoopLeavesTheServiceUnscheduled) {
     stand.tearDown();
 }
 
+TEST(ServiceSeamsTest, ALoopWithoutAModeLeavesTheServiceUnscheduled) {
+    ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+    EveryLine log;
+    const Vexa::LogWithoutBlocking startsTheLogsThread;
+    const std::size_t threads = threadCount();
+    loopsHaveModes = false;
+    stand.service.schedule(stand.queue);
+    loopsHaveModes = true;
+    EXPECT_THAT(log.take(), ElementsAre(error("input report thread has no run loop")));
+    stand.service.unschedule(stand.queue);
+    ASSERT_TRUE(waitForThreads(threads));
+    EXPECT_EQ(stand.service.references(), 2U);
+    stand.startUp();
+    EXPECT_TRUE(stand.feed({firmwareReport(0)}));
+    stand.tearDown();
+}
+
+TEST(ServiceSeamsTest, AThreadWhoseLoopFailsIsUnscheduledLikeAnyOther) {
+    ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+    const Vexa::LogWithoutBlocking startsTheLogsThread;
+    const std::size_t threads = threadCount();
+    // Whether it has ended by itself or is about to when it is told to stop.
+    for (const bool hasEnded : {false, true}) {
+        EveryLine log;
+        loopsWait = false;
+        stand.service.schedule(stand.queue);
+        if (hasEnded) {
+            ASSERT_TRUE(waitForThreads(threads));
+        }
+        stand.service.unschedule(stand.queue);
+        loopsWait = true;
+        ASSERT_TRUE(waitForThreads(threads));
+        EXPECT_THAT(log.take(), ElementsAre(error("input report run loop failed")));
+        EXPECT_EQ(stand.service.references(), 2U);
+    }
+    stand.startUp();
+    EXPECT_TRUE(stand.feed({firmwareReport(0)}));
+    stand.tearDown();
+}
+
+/// While one lives no thread can be started: none has a stack as large as it asks for.
+class NoThreads {
+public:
+    NoThreads() {
+        EXPECT_EQ(pthread_getattr_default_np(&usual_), 0);
+        pthread_attr_t endless = usual_;
+        EXPECT_EQ(pthread_attr_setstacksize(&endless, SIZE_MAX / 4 + 1), 0);
+        EXPECT_EQ(pthread_setattr_default_np(&endless), 0);
+    }
+    ~NoThreads() {
+        EXPECT_EQ(pthread_setattr_default_np(&usual_), 0);
+        pthread_attr_destroy(&usual_);
+    }
+    NoThreads(const NoThreads&) = delete;
+    NoThreads(NoThreads&&) = delete;
+    NoThreads& operator=(const NoThreads&) = delete;
+    NoThreads& operator=(NoThreads&&) = delete;
+
+private:
+    pthread_attr_t usual_{};
+};
+
+TEST(ServiceSeamsTest, ASecondSchedulingThatFailsLeavesTheFirstAsItWas) {
+    for (const bool threadStarts : {false, true}) {
+        ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+        EveryLine log;
+        const Vexa::LogWithoutBlocking startsTheLogsThread;
+        const std::size_t threads = threadCount();
+        stand.startUp();
+        {
+            const Vexa::SerialQueue second("second");
+            if (threadStarts) {
+                haveRunLoops = false;
+                stand.service.schedule(second);
+                haveRunLoops = true;
+            } else {
+                const NoThreads none;
+                stand.service.schedule(second);
+            }
+        }
+        EXPECT_THAT(log.take(),
+                    ElementsAre(error(threadStarts ? "input report thread has no run loop"
+                                                   : "input report thread not started: 11")));
+        EXPECT_TRUE(stand.feed({firmwareReport(0)}));
+        EXPECT_EQ(stand.events.take().size(), 1U);
+        stand.tearDown();
+        ASSERT_TRUE(waitForThreads(threads));
+    }
+}
+
 TEST(ServiceSeamsTest, AThreadThatDoesNotStartLeavesTheServiceUnscheduled) {
     ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
     EveryLine log;
     const std::size_t threads = threadCount();
-    pthread_attr_t usual;
-    ASSERT_EQ(pthread_getattr_default_np(&usual), 0);
-    pthread_attr_t endless = usual;
-    ASSERT_EQ(pthread_attr_setstacksize(&endless, SIZE_MAX / 4 + 1), 0);
-    ASSERT_EQ(pthread_setattr_default_np(&endless), 0);
-    stand.service.schedule(stand.queue);
-    ASSERT_EQ(pthread_setattr_default_np(&usual), 0);
-    pthread_attr_destroy(&usual);
+    {
+        const NoThreads none;
+        stand.service.schedule(stand.queue);
+    }
     static_assert(EAGAIN == 11);
     EXPECT_THAT(log.take(), ElementsAre(error("input report thread not started: 11")));
     EXPECT_EQ(stand.service.references(), 2U);
@@ -402,18 +499,18 @@ TEST(ServiceSeamsTest, ARunGivesTheDeviceOneBufferAndTakesItBack) {
 
     const std::vector<DeviceCall> calls = deviceCalls.take();
     ASSERT_EQ(calls.size(), 4U);
-    std::uint8_t* const buffer = calls[1].buffer;
+    std::uint8_t* const buffer = calls[0].buffer;
     EXPECT_NE(buffer, nullptr);
     const std::string mode = "kHandleInputReportsRunLoopMode";
     // All between the two signals of the run, since its host waits for the second one.
     const int started = VEXA_COUNTS_SIGNALS;
     EXPECT_THAT(calls,
-                ElementsAre(DeviceCall{.name = "schedule", .mode = mode, .signals = started},
-                            DeviceCall{.name = "setInputReportCallback",
+                ElementsAre(DeviceCall{.name = "setInputReportCallback",
                                        .buffer = buffer,
                                        .length = 512,
                                        .hasCallback = true,
                                        .signals = started},
+                            DeviceCall{.name = "schedule", .mode = mode, .signals = started},
                             DeviceCall{.name = "unschedule", .mode = mode, .signals = started},
                             DeviceCall{.name = "setInputReportCallback",
                                        .buffer = buffer,
