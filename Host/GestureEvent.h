@@ -28,8 +28,9 @@ struct GestureEvent {
     /// 1 play, 2 volume down, 3 volume up; 0 none.
     std::uint32_t region = 0;
 
-    /// A vendor-defined event is the notice of a firmware reset; a coordinate that is no region
-    /// number counts as none.
+    /// A vendor-defined event is the notice of a firmware reset. What no service of ours makes does
+    /// least: a phase that is not known counts as cancelled, a coordinate that is no number of a
+    /// region as none.
     static GestureEvent of(const Vexa::HidEvent& event) noexcept;
 
     friend bool operator==(const GestureEvent&, const GestureEvent&) = default;
