@@ -1,0 +1,208 @@
+#include "Tools/LiveRun.h"
+
+#include "Host/PluginLibrary.h"
+#include "Platform/HostClock.h"
+#include "Tests/Support/FakeKeyboard.h"
+#include "Tests/Tools/CommandRun.h"
+#include "Tools/EventRecord.h"
+#include "Tools/Failure.h"
+#include "Tools/PlayedDevice.h"
+#include "Tools/RecordedDevice.h"
+#include "Tools/RecordingFile.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/WakeUp.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <filesystem>
+#include <functional>
+#include <limits>
+#include <memory>
+#include <set>
+#include <sstream>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace VexaTouch::Testing {
+namespace {
+
+using ::testing::HasSubstr;
+using ::testing::Not;
+using ::testing::SizeIs;
+using Tools::EventKind;
+using Tools::EventRecord;
+using Tools::PlayedDevice;
+
+const std::filesystem::path kExamples = VEXA_SOURCE_DIR "/Examples";
+constexpr double kAsFastAsTaken = std::numeric_limits<double>::infinity();
+
+/// What the keys of a gesture are called in the text of a fake keyboard.
+std::string_view tapKey(std::uint32_t region) {
+    return std::vector<std::string_view>{"", "KEY_PLAYPAUSE", "KEY_VOLUMEDOWN", "KEY_VOLUMEUP"}.at(
+        region);
+}
+std::string_view holdKey(std::uint32_t region) {
+    return std::vector<std::string_view>{"", "KEY_ASSISTANT", "KEY_VOLUMEDOWN", "KEY_VOLUMEUP"}.at(
+        region);
+}
+
+/// What these events must type, a hold that never ends released at the end.
+std::string expectedKeys(const std::vector<EventRecord>& events) {
+    std::string text;
+    std::string_view held;
+    for (const EventRecord& event : events) {
+        const std::string_view holds =
+            event.kind == EventKind::HoldStart || event.kind == EventKind::HoldChange
+                ? holdKey(event.region)
+                : std::string_view();
+        std::string packet;
+        if (!held.empty() && held != holds) {
+            packet += '-' + std::string(held) + ' ';
+        }
+        if (!holds.empty() && held != holds) {
+            packet += '+' + std::string(holds) + ' ';
+        }
+        held = holds;
+        text += packet + (packet.empty() ? "" : "| ");
+        if (event.kind == EventKind::Tap && event.region != 0) {
+            const std::string key(tapKey(event.region));
+            text += '+' + key + " | -" + key + " | ";
+        }
+    }
+    return held.empty() ? text : text + '-' + std::string(held) + " | ";
+}
+
+class LiveRunTest : public ::testing::Test {
+protected:
+    LiveRunTest() { setenv("VEXATOUCH_PLUGIN", VEXATOUCH_PLUGIN_FILE, 1); }
+    ~LiveRunTest() override {
+        unsetenv("VEXATOUCH_PLUGIN");
+        EXPECT_EQ(typed.wrong, "");
+        EXPECT_TRUE(typed.down.empty());
+        EXPECT_FALSE(typed.unseen);
+    }
+
+    std::vector<PlayedDevice::Frame> framesOf(const std::string& name) {
+        const auto list = Tools::readRecording(kExamples / (name + ".json"), streams).frames;
+        return {list.begin(), list.end()};
+    }
+    static std::shared_ptr<PlayedDevice> deviceThat(PlayedDevice::FrameSource plays) {
+        return std::make_shared<PlayedDevice>(std::move(plays),
+                                              Tools::PlayedPace{.speed = kAsFastAsTaken},
+                                              Tools::SurfaceIdentity{}, Vexa::HostClock::system());
+    }
+    /// Throws as LiveRun does.
+    void run(const std::shared_ptr<PlayedDevice>& device, const Host::KeyMap& map = {}) {
+        const Tools::WakeUp wake;
+        Tools::SignalWatch signals(wake);
+        const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
+        Tools::LiveRun live(library, device,
+                            {.json = true, .keyboard = keyboard.get(), .keyMap = map}, signals,
+                            wake, streams);
+        live.run();
+    }
+    void play(const std::string& name, const Host::KeyMap& map = {}) {
+        run(deviceThat(Tools::recordingSource(
+                Tools::readRecording(kExamples / (name + ".json"), streams).frames)),
+            map);
+    }
+
+    std::istringstream in;
+    std::ostringstream out;
+    std::ostringstream error;
+    Tools::Streams streams{.in = in, .out = out, .error = error};
+    TypedKeys typed;
+    std::unique_ptr<Host::SharedKeyboard> keyboard = FakeKeyboard::shared(typed);
+};
+
+TEST_F(LiveRunTest, EveryExampleTypesItsKeysAndLeavesNoneDown) {
+    std::set<EventKind> kinds;
+    for (const auto& entry : std::filesystem::directory_iterator(kExamples)) {
+        if (entry.path().extension() != ".events") {
+            continue;
+        }
+        SCOPED_TRACE(entry.path());
+        const std::vector<EventRecord> events = Tools::readExpectedEvents(entry.path());
+        for (const EventRecord& event : events) {
+            kinds.insert(event.kind);
+        }
+        play(entry.path().stem());
+        EXPECT_EQ(std::exchange(typed.text, {}), expectedKeys(events));
+        EXPECT_TRUE(typed.down.empty());
+    }
+    EXPECT_THAT(kinds, SizeIs(7));
+    EXPECT_THAT(error.str(), Not(HasSubstr("key")));
+}
+
+TEST_F(LiveRunTest, ChangedKeysAreTyped) {
+    Host::KeyMap map;
+    for (const std::string change : {"tap:1=KEY_NEXTSONG", "tap:2=none", "tap:3=none",
+                                     "hold:1=none", "hold:2=none", "hold:3=none"}) {
+        map.assign(change);
+    }
+    play("mixed", map);
+    std::string expected;
+    for (const EventRecord& event : Tools::readExpectedEvents(kExamples / "mixed.events")) {
+        if (event.kind == EventKind::Tap && event.region == 1) {
+            expected += "+KEY_NEXTSONG | -KEY_NEXTSONG | ";
+        }
+    }
+    EXPECT_NE(expected, "");
+    EXPECT_EQ(typed.text, expected);
+}
+
+/// Plays what leads to the first hold, waits until that was handled, and goes on with `then`.
+PlayedDevice::FrameSource upToTheFirstHold(std::vector<PlayedDevice::Frame> frames,
+                                           std::function<void()> then) {
+    const auto events = Tools::readExpectedEvents(kExamples / "holds.events");
+    const auto start = std::ranges::find(events, EventKind::HoldStart, &EventRecord::kind);
+    frames.resize(start->index + 1);
+    // A setting has its turn when all reports before it have been handled.
+    PlayedDevice::Frame setting;
+    setting.type = PlayedDevice::Frame::Type::State;
+    setting.key = "Nothing";
+    setting.value = Vexa::PropertyValue::null();
+    frames.push_back(setting);
+    return
+        [frames = std::move(frames), then = std::move(then)](const PlayedDevice::FrameSink& sink) {
+            for (const auto& frame : frames) {
+                sink(frame);
+            }
+            then();
+        };
+}
+
+TEST_F(LiveRunTest, EndInAHoldReleasesItsKey) {
+    run(deviceThat(upToTheFirstHold(framesOf("holds"), [] {})));
+    EXPECT_EQ(typed.take(), "+KEY_ASSISTANT | -KEY_ASSISTANT |");
+}
+
+TEST_F(LiveRunTest, UnplugInAHoldReleasesItsKey) {
+    PlayedDevice* unplugged = nullptr;
+    const auto device =
+        deviceThat(upToTheFirstHold(framesOf("holds"), [&unplugged] { unplugged->unplug(); }));
+    unplugged = device.get();
+    EXPECT_THROW(run(device), Tools::Failure);
+    EXPECT_EQ(typed.take(), "+KEY_ASSISTANT | -KEY_ASSISTANT |");
+}
+
+TEST_F(LiveRunTest, KeyboardThatIsTakenAwayIsToldOfOnceAndTheRunGoesOn) {
+    typed.good = 2;
+    play("taps");
+    EXPECT_EQ(typed.take(), "+KEY_PLAYPAUSE |");
+    EXPECT_TRUE(typed.gone);
+    const std::string text =
+        "vexatouch run: the keyboard is gone, no more keys are sent: No such device\n";
+    EXPECT_THAT(error.str(), HasSubstr(text));
+    EXPECT_EQ(error.str().find(text), error.str().rfind(text));
+    EXPECT_THAT(linesOf(out.str()),
+                SizeIs(Tools::readExpectedEvents(kExamples / "taps.events").size()));
+}
+
+}  // namespace
+}  // namespace VexaTouch::Testing
