@@ -25,6 +25,10 @@ Setting parseSetting(std::string_view text, std::string_view option = "--set");
 std::vector<Setting> parseSettings(std::span<const std::string> texts,
                                    std::string_view option = "--set");
 
+/// Every key that holds a setting, as a pipeline takes it, an indexed one once for each index.
+/// What can only be written, or only read, is none.
+std::vector<std::string> pipelineSettingKeys();
+
 /// The keys that can be set, their defaults and meaning: aligned lines for help and error texts.
 std::string settingKeysText();
 
