@@ -5,6 +5,7 @@
 #include "Tools/GetCommand.h"
 #include "Tools/InfoCommand.h"
 #include "Tools/LatencyCommand.h"
+#include "Tools/RecordCommand.h"
 #include "Tools/ReplayCommand.h"
 #include "Tools/RunCommand.h"
 #include "Tools/SetCommand.h"
@@ -21,8 +22,9 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &runCommand,  &getCommand,  &setCommand,     &latencyCommand, &validateCommand, &replayCommand,
-    &infoCommand, &showCommand, &convertCommand, &synthCommand,   &diffCommand,
+    &runCommand,     &recordCommand,   &getCommand,    &setCommand,
+    &latencyCommand, &validateCommand, &replayCommand, &infoCommand,
+    &showCommand,    &convertCommand,  &synthCommand,  &diffCommand,
 };
 
 }  // namespace

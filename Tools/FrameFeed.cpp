@@ -119,8 +119,8 @@ void FrameFeed::close() noexcept {
     if (gap_ != FrameGap{}) {
         // There is always room for it.
         const FrameGap gap = std::exchange(gap_, {});
-        publish(append(put_.load(std::memory_order_relaxed),
-                       Record(kGap, 0, {bytesOf(gap), {}, {}})));
+        publish(
+            append(put_.load(std::memory_order_relaxed), Record(kGap, 0, {bytesOf(gap), {}, {}})));
     }
     closed_.store(true);
     wake_();
@@ -209,8 +209,7 @@ void FrameDecoder::write(std::span<const std::uint8_t> bytes) {
         left = left.subspan(taken);
     }
     if (hadPending) {
-        pending_.erase(pending_.begin(),
-                       pending_.end() - static_cast<std::ptrdiff_t>(left.size()));
+        pending_.erase(pending_.begin(), pending_.end() - static_cast<std::ptrdiff_t>(left.size()));
     } else {
         pending_.assign(left.begin(), left.end());
     }

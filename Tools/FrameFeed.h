@@ -58,6 +58,9 @@ public:
     /// Whether the putting side is done. What it put before is readable by then.
     [[nodiscard]] bool isClosed() const noexcept { return closed_.load(); }
 
+    /// Bytes that wait to be taken, and room for how many there is in all. Any thread.
+    [[nodiscard]] std::uint64_t waiting() const noexcept { return put_.load() - taken_.load(); }
+    [[nodiscard]] std::size_t size() const noexcept { return size_; }
     /// Everything that was left out so far. Any thread.
     [[nodiscard]] FrameGap lost() const noexcept;
 
@@ -107,8 +110,7 @@ public:
 
 private:
     [[nodiscard]] std::size_t takeOne(std::span<const std::uint8_t> bytes);
-    void take(std::uint32_t type, std::uint64_t timestampNs,
-              std::span<const std::uint8_t> payload);
+    void take(std::uint32_t type, std::uint64_t timestampNs, std::span<const std::uint8_t> payload);
 
     Sink sink_;
     bool begun_ = false;

@@ -6,12 +6,13 @@
 
 #include <algorithm>
 #include <cassert>
+#include <string_view>
 #include <utility>
 
 namespace VexaTouch::Tools {
 namespace {
 
-const std::string kPipelineDomain = "Pipeline";
+constexpr std::string_view kPipelineDomain = "Pipeline";
 
 /// A setting ready to be put, so that nothing is left to be made while inputs wait.
 struct PreparedSetting {
@@ -22,7 +23,7 @@ struct PreparedSetting {
 std::vector<PreparedSetting> settingsInForce(const Host::HostSession& session) {
     std::vector<PreparedSetting> settings;
     for (std::string& key : pipelineSettingKeys()) {
-        if (const auto value = session.property(kPipelineDomain + '.' + key)) {
+        if (const auto value = session.property(std::string(kPipelineDomain) + '.' + key)) {
             settings.push_back({.key = std::move(key), .json = settingText(value)});
         }
     }
@@ -59,7 +60,7 @@ void InputTap::remove(const std::shared_ptr<FrameFeed>& feed) {
 bool InputTap::setProperty(const Host::HostSession& session, const std::string& key,
                            const Vexa::PropertyValue& value) {
     PreparedSetting setting{.key = key, .json = {}};
-    if (!Util::stripDomainFromKey(setting.key, kPipelineDomain)) {
+    if (!Util::stripDomainFromKey(setting.key, std::string(kPipelineDomain))) {
         return session.setProperty(key, value);
     }
     setting.json = settingText(value);

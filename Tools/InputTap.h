@@ -67,7 +67,8 @@ private:
 /// A device whose reports a tap sees; all else is the device's.
 class TappedDevice final : public Vexa::DeviceBackend {
 public:
-    TappedDevice(std::shared_ptr<Vexa::DeviceBackend> device, std::shared_ptr<InputTap> tap) noexcept;
+    TappedDevice(std::shared_ptr<Vexa::DeviceBackend> device,
+                 std::shared_ptr<InputTap> tap) noexcept;
 
     vexa_status open(std::uint32_t options, int& descriptor) noexcept override;
     void close(std::uint32_t options) noexcept override;

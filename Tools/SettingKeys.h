@@ -17,6 +17,11 @@ struct Setting {
     friend bool operator==(const Setting&, const Setting&) = default;
 };
 
+/// The beginnings of KEY=VALUE, for completion.
+inline constexpr std::string_view kSettingChoices =
+    "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= EnableTapSuppression= "
+    "VirtualNormalizationFactors. ResetEventStats=";
+
 /// Reads KEY=VALUE: the key as the host writes it ("Pipeline.Algs.ActivationThreshold") or the bare
 /// key of the algorithm, the value as JSON. Throws UsageError, with the list of keys, for a key
 /// that nothing knows, a read-only key, an index out of range or a value that is no JSON. `option`
