@@ -122,11 +122,11 @@ bool TappedDevice::setProperty(const Vexa::PropertyValue& key,
 
 void TappedDevice::reportArrived(std::span<const std::uint8_t> report,
                                  std::uint64_t timestamp) noexcept {
-    device_->reportArrived(report, timestamp);
     tap_->reportArrived(report);
+    device_->reportArrived(report, timestamp);
 }
 
-// The tap first: whoever is told by the device may write a setting next.
+// The tap first, here too: whoever is told by the device may write a setting next.
 void TappedDevice::reportHandled() noexcept {
     tap_->reportHandled();
     device_->reportHandled();

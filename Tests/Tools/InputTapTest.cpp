@@ -12,10 +12,16 @@
 
 #include <gmock/gmock.h>
 
+#include <sched.h>
+
+#include <atomic>
 #include <cstdint>
 #include <cstdlib>
+#include <functional>
 #include <iterator>
 #include <memory>
+#include <optional>
+#include <span>
 #include <string>
 #include <thread>
 #include <utility>
@@ -57,9 +63,9 @@ protected:
              .onGap = [](const FrameGap&) { ADD_FAILURE() << "a gap"; }}};
     };
     /// What the service itself recorded.
-    FrameList recorded() const {
+    static FrameList recorded(const Host::HostSession& service) {
         ContainerReader reader;
-        const Vexa::PropertyValue recording = session.property("Recording");
+        const Vexa::PropertyValue recording = service.property("Recording");
         reader.write(*recording.asString());
         return reader.finish();
     }
@@ -130,7 +136,58 @@ TEST_F(InputTapTest, FeedHoldsExactlyWhatTheServiceRecordsWhileManyWriteSettings
     }
     // The service leaves out settings that were superseded before the next report.
     PipelineRecording::trimFrames(frames, 1350);
-    EXPECT_EQ(described(frames), described(recorded()));
+    EXPECT_EQ(described(frames), described(recorded(session)));
+}
+
+/// A device that does something else between the arrival of a report and the service.
+class MeddlingDevice final : public Vexa::DeviceBackend {
+public:
+    MeddlingDevice(std::shared_ptr<Vexa::DeviceBackend> device, std::function<void()> meddle)
+        : device_(std::move(device)), meddle_(std::move(meddle)) {}
+
+    vexa_status open(std::uint32_t options, int& descriptor) noexcept override {
+        return device_->open(options, descriptor);
+    }
+    void close(std::uint32_t options) noexcept override { device_->close(options); }
+    void reportArrived(std::span<const std::uint8_t>, std::uint64_t) noexcept override {
+        meddle_();
+    }
+    void reportHandled() noexcept override { device_->reportHandled(); }
+
+private:
+    std::shared_ptr<Vexa::DeviceBackend> device_;
+    std::function<void()> meddle_;
+};
+
+TEST_F(InputTapTest, SettingWaitsForTheReportThatHasArrived) {
+    std::optional<Host::HostSession> meddled;
+    std::jthread writer;
+    std::atomic<bool> written = false;
+    const Vexa::DeviceRegistration meddledRegistration(std::make_shared<TappedDevice>(
+        std::make_shared<MeddlingDevice>(device,
+                                         [&] {
+                                             writer = std::jthread([&] {
+                                                 tap->setProperty(*meddled, "Pipeline.Late", 1);
+                                                 written = true;
+                                             });
+                                             // Every occasion to come in between.
+                                             constexpr int kOccasions = 20'000;
+                                             for (int i = 0; i < kOccasions && !written; ++i) {
+                                                 sched_yield();
+                                             }
+                                         }),
+        tap));
+    meddled.emplace(library, meddledRegistration.service(), [](const Vexa::HidEvent&) {});
+    Watched watched;
+    tap->add(watched.feed, *meddled);
+    static_cast<void>(watched.frames());
+    meddled->begin();
+    report({7, 7});
+    ASSERT_TRUE(device->waitUntilHandled(1));
+    writer.join();
+    meddled->halt();
+    EXPECT_EQ(described(recorded(*meddled)), (std::vector<std::string>{"07 07 ", "Late = 1"}));
+    EXPECT_EQ(described(watched.frames()), (std::vector<std::string>{"07 07 ", "Late = 1"}));
 }
 
 TEST_F(InputTapTest, FeedsComeAndGoWhileReportsDo) {
