@@ -23,6 +23,9 @@ bool DeviceBackend::setProperty(const PropertyValue& /*key*/,
     return false;
 }
 
+void DeviceBackend::reportArrived(std::span<const std::uint8_t> /*report*/,
+                                  std::uint64_t /*timestamp*/) noexcept {}
+
 void DeviceBackend::reportHandled() noexcept {}
 
 namespace {
@@ -53,6 +56,11 @@ constexpr vexa_device_backend kTable{
     },
     .report_handled = [](void* context) { backendOf(context).reportHandled(); },
     .destroy = [](void* context) { delete static_cast<Owner*>(context); },
+    .report_arrived =
+        [](void* context, const std::uint8_t* report, std::size_t length,
+           std::uint64_t timestamp) {
+            backendOf(context).reportArrived({report, length}, timestamp);
+        },
 };
 
 }  // namespace

@@ -32,7 +32,11 @@ public:
     virtual PropertyValue property(const PropertyValue& key) noexcept;
     /// False unless overridden.
     virtual bool setProperty(const PropertyValue& key, const PropertyValue& value) noexcept;
-    /// One report was handled by the service. On the input thread; must not block.
+    /// One report was read and goes to the service next; the bytes are only good during the call.
+    /// `timestamp` is in host ticks. On the input thread; must not block.
+    virtual void reportArrived(std::span<const std::uint8_t> report,
+                               std::uint64_t timestamp) noexcept;
+    /// The service is done with the report that arrived last. On the input thread; must not block.
     virtual void reportHandled() noexcept;
 };
 

@@ -6,6 +6,7 @@
 #include "Tools/InfoCommand.h"
 #include "Tools/KeysCommand.h"
 #include "Tools/LatencyCommand.h"
+#include "Tools/RecordCommand.h"
 #include "Tools/ReplayCommand.h"
 #include "Tools/RunCommand.h"
 #include "Tools/SetCommand.h"
@@ -22,8 +23,9 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &runCommand,    &getCommand,  &setCommand,  &keysCommand,    &latencyCommand, &validateCommand,
-    &replayCommand, &infoCommand, &showCommand, &convertCommand, &synthCommand,   &diffCommand,
+    &runCommand,     &recordCommand,   &getCommand,    &setCommand,  &keysCommand,
+    &latencyCommand, &validateCommand, &replayCommand, &infoCommand, &showCommand,
+    &convertCommand, &synthCommand,    &diffCommand,
 };
 
 }  // namespace

@@ -2,6 +2,7 @@
 
 #include "Tools/Failure.h"
 #include "Tools/InputFile.h"
+#include "Tools/OptionValues.h"
 #include "Tools/RecordedDevice.h"
 #include "Tools/RecordingFile.h"
 #include "Tools/SimulatedSurface.h"
@@ -117,6 +118,22 @@ DeviceChoice DeviceChoice::parse(std::string_view text, std::string_view option)
     refuse(given,
            "expected sim, sim:SCRIPT or recording:FILE, with @2 or @max behind the file "
            "for a speed");
+}
+
+DeviceWishes deviceWishes(const Arguments& arguments, const DeviceChoice& choice) {
+    DeviceWishes wishes;
+    if (choice.kind != DeviceChoice::Kind::Simulated) {
+        for (const OptionEntry& option : {kSeedOption, kRateOption, kEndlessOption}) {
+            if (arguments.given(option.name)) {
+                throw UsageError(std::string(option.name) + " is for a simulated surface");
+            }
+        }
+    }
+    constexpr double kHighestRate = 1e6;
+    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.rate = rateOption(arguments, kRateOption.name, kHighestRate);
+    wishes.endless = arguments.given(kEndlessOption.name);
+    return wishes;
 }
 
 std::shared_ptr<PlayedDevice> makeDevice(const DeviceChoice& choice, const DeviceWishes& wishes,

@@ -57,6 +57,17 @@ inline constexpr OptionEntry kDeviceOption = {.name = "--device",
 inline constexpr OptionEntry kSeedOption = {
     .name = "--seed", .valueName = "N", .help = "Seed of the simulated surface's random numbers"};
 
+inline constexpr OptionEntry kRateOption = {
+    .name = "--rate",
+    .valueName = "HZ",
+    .help = "Reports a second that the simulated surface sends"};
+inline constexpr OptionEntry kEndlessOption = {.name = "--endless",
+                                               .help = "Begin a script anew when it is over"};
+
+/// What --seed, --rate and --endless say; the command must have all three. Throws UsageError,
+/// also when one is given for a device that has no use of it.
+DeviceWishes deviceWishes(const Arguments& arguments, const DeviceChoice& choice);
+
 /// Makes the device; its waiting is by the streams' clock. Throws Failure when a file cannot be
 /// read.
 std::shared_ptr<PlayedDevice> makeDevice(const DeviceChoice& choice, const DeviceWishes& wishes,

@@ -32,8 +32,7 @@ constexpr std::array<OptionEntry, 14> kOptions = {{
              "recording or script may change it later",
      .repeatable = true,
      .kind = ValueKind::Choice,
-     .choices = "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= "
-                "EnableTapSuppression= VirtualNormalizationFactors. ResetEventStats="},
+     .choices = kSettingChoices},
     {.name = "--keys",
      .help = "Send the keys of the gestures to the system, through a keyboard that uinput makes; "
              "--key alone does so too. Without either none are sent"},
@@ -56,10 +55,8 @@ constexpr std::array<OptionEntry, 14> kOptions = {{
     {.name = "--duration", .valueName = "TIME", .help = "End after a time: 10, 10s, 500ms, 2min"},
     {.name = "--count", .valueName = "N", .help = "End after so many events"},
     kSeedOption,
-    {.name = "--rate",
-     .valueName = "HZ",
-     .help = "Reports a second that the simulated surface sends"},
-    {.name = "--endless", .help = "Begin a script anew when it is over"},
+    kRateOption,
+    kEndlessOption,
     kLogOption,
 }};
 
@@ -136,27 +133,11 @@ LiveRunOptions parseOptions(const Arguments& arguments, Streams& streams) {
     return options;
 }
 
-DeviceWishes parseWishes(const Arguments& arguments, const DeviceChoice& choice) {
-    DeviceWishes wishes;
-    if (choice.kind != DeviceChoice::Kind::Simulated) {
-        for (const char* option : {"--seed", "--rate", "--endless"}) {
-            if (arguments.given(option)) {
-                throw UsageError(std::string(option) + " is for a simulated surface");
-            }
-        }
-    }
-    constexpr double kHighestRate = 1e6;
-    wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
-    wishes.rate = rateOption(arguments, "--rate", kHighestRate);
-    wishes.endless = arguments.given("--endless");
-    return wishes;
-}
-
 int runRun(const Arguments& arguments, Streams& streams) {
     LiveRunOptions options = parseOptions(arguments, streams);
     options.keyMap = parseKeyMap(arguments.values(kKeyOption.name));
     const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
-    const DeviceWishes wishes = parseWishes(arguments, choice);
+    const DeviceWishes wishes = deviceWishes(arguments, choice);
     if (!options.recordFile.empty()) {
         tryRecordFile(options.recordFile, streams);
     }

@@ -84,6 +84,24 @@ std::vector<Setting> parseSettings(std::span<const std::string> texts, std::stri
     return settings;
 }
 
+std::vector<std::string> pipelineSettingKeys() {
+    std::vector<std::string> keys;
+    for (const StateKeyEntry& entry : kStateKeys) {
+        if (!entry.readable || !entry.writable) {
+            continue;
+        }
+        const std::string key = std::string(kPipelinePrefix) + std::string(entry.name);
+        if (!entry.indexed) {
+            keys.push_back(key);
+            continue;
+        }
+        for (std::size_t index = 0; index < kVirtualPixelCount; ++index) {
+            keys.push_back(key + '.' + std::to_string(index));
+        }
+    }
+    return keys;
+}
+
 std::string settingKeysText() {
     std::string text;
     for (const StateKeyEntry& entry : kStateKeys) {

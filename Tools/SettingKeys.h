@@ -17,6 +17,11 @@ struct Setting {
     friend bool operator==(const Setting&, const Setting&) = default;
 };
 
+/// The beginnings of KEY=VALUE, for completion.
+inline constexpr std::string_view kSettingChoices =
+    "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= EnableTapSuppression= "
+    "VirtualNormalizationFactors. ResetEventStats=";
+
 /// Reads KEY=VALUE: the key as the host writes it ("Pipeline.Algs.ActivationThreshold") or the bare
 /// key of the algorithm, the value as JSON. Throws UsageError, with the list of keys, for a key
 /// that nothing knows, a read-only key, an index out of range or a value that is no JSON. `option`
@@ -24,6 +29,10 @@ struct Setting {
 Setting parseSetting(std::string_view text, std::string_view option = "--set");
 std::vector<Setting> parseSettings(std::span<const std::string> texts,
                                    std::string_view option = "--set");
+
+/// Every key that holds a setting, as a pipeline takes it, an indexed one once for each index.
+/// What can only be written, or only read, is none.
+std::vector<std::string> pipelineSettingKeys();
 
 /// The keys that can be set, their defaults and meaning: aligned lines for help and error texts.
 std::string settingKeysText();

@@ -60,10 +60,12 @@ SignalWatch::SignalWatch(const WakeUp& wake) : wake_(wake) {
     struct sigaction ignore{};
     ignore.sa_handler = SIG_IGN;
     sigaction(SIGPIPE, &ignore, &previousPipe_);
+    sigaction(SIGXFSZ, &ignore, &previousFileSize_);
     try {
         thread_ = std::thread([this] { watch(); });
     } catch (const std::system_error& error) {
         sigaction(SIGPIPE, &previousPipe_, nullptr);
+        sigaction(SIGXFSZ, &previousFileSize_, nullptr);
         pthread_sigmask(SIG_SETMASK, &previousMask_, nullptr);
         throw Failure(std::string("cannot watch for signals: ") + error.what());
     }
@@ -74,6 +76,7 @@ SignalWatch::~SignalWatch() {
     static_cast<void>(::write(over_.get(), &one, sizeof one) == sizeof one);
     thread_.join();
     sigaction(SIGPIPE, &previousPipe_, nullptr);
+    sigaction(SIGXFSZ, &previousFileSize_, nullptr);
     pthread_sigmask(SIG_SETMASK, &previousMask_, nullptr);
 }
 

@@ -10,8 +10,8 @@
 namespace VexaTouch::Tools {
 
 /// Takes the signals that a long run is steered by, as long as it lives: SIGINT, SIGTERM and SIGHUP
-/// ask for an end, SIGUSR1 for the recording; SIGPIPE only makes the writing fail. The second
-/// signal that asks for an end ends the process at once.
+/// ask for an end, SIGUSR1 for the recording; SIGPIPE and SIGXFSZ only make the writing fail. The
+/// second signal that asks for an end ends the process at once.
 ///
 /// Signals are read by a thread of its own, so that the second one also works while everybody else
 /// is stuck; no handler interrupts anybody. Made before any thread that shall not be bothered by
@@ -40,6 +40,7 @@ private:
     std::atomic<bool> recordingWanted_ = false;
     sigset_t previousMask_{};
     struct sigaction previousPipe_{};
+    struct sigaction previousFileSize_{};
     FileDescriptor signals_;
     FileDescriptor over_;
     std::thread thread_;

@@ -43,6 +43,11 @@ bool Backend::setProperty(const vexa_value* key, const vexa_value* value) const 
     return table_.set_property && table_.set_property(context_, key, value);
 }
 
+void Backend::reportArrived(const std::uint8_t* report, std::size_t length,
+                            std::uint64_t timestamp) const noexcept {
+    if (table_.report_arrived) table_.report_arrived(context_, report, length, timestamp);
+}
+
 void Backend::reportHandled() const noexcept {
     if (table_.report_handled) table_.report_handled(context_);
 }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <vexa/device.h>
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 
@@ -25,6 +26,8 @@ public:
                           std::size_t& length) const noexcept;
     vexa_value* copyProperty(const vexa_value* key) const noexcept;
     bool setProperty(const vexa_value* key, const vexa_value* value) const noexcept;
+    void reportArrived(const std::uint8_t* report, std::size_t length,
+                       std::uint64_t timestamp) const noexcept;
     void reportHandled() const noexcept;
 
 private:

@@ -7,6 +7,7 @@
 #include <gmock/gmock.h>
 
 #include <fcntl.h>
+#include <sys/socket.h>
 #include <unistd.h>
 #include <array>
 #include <atomic>
@@ -893,6 +894,73 @@ TEST(BareBackend, OfAnOlderHeaderHasNoNewerEntries) {
     EXPECT_EQ(bare.closes, 1);
     vexa_service_unregister(service);
     EXPECT_EQ(bare.destroys, 0);
+    ::close(ends[1]);
+}
+
+// Notes what it is told of reports, in order, with what the callback got in between.
+struct Told {
+    struct Arrived {
+        Bytes bytes;
+        std::uint64_t timestamp;
+    };
+    std::vector<Arrived> arrived;
+    std::vector<std::string_view> order;
+    int descriptor = -1;
+    std::latch done{2};
+
+    static vexa_status open(void* context, std::uint32_t, int* descriptor) {
+        *descriptor = static_cast<Told*>(context)->descriptor;
+        return VEXA_STATUS_SUCCESS;
+    }
+    static void reportArrived(void* context, const std::uint8_t* report, std::size_t length,
+                              std::uint64_t timestamp) {
+        auto& self = *static_cast<Told*>(context);
+        self.arrived.push_back({Bytes(report, report + length), timestamp});
+        self.order.emplace_back("arrived");
+    }
+    static void reportHandled(void* context) {
+        auto& self = *static_cast<Told*>(context);
+        self.order.emplace_back("handled");
+        self.done.count_down();
+    }
+};
+
+TEST(BareBackend, IsToldOfEachReportBeforeTheCallbackAndAfterIt) {
+    Told told;
+    std::array<int, 2> ends{};
+    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_SEQPACKET, 0, ends.data()), 0);
+    told.descriptor = ends[0];
+    vexa_device_backend table{};
+    table.size = sizeof table;
+    table.open = &Told::open;
+    table.report_arrived = &Told::reportArrived;
+    table.report_handled = &Told::reportHandled;
+    const std::uint32_t service = vexa_service_register(&table, &told);
+    ASSERT_NE(service, 0U);
+    const HidDevice device = HidDevice::create(service);
+    ASSERT_EQ(device.open(0), VEXA_STATUS_SUCCESS);
+    Reader reader(4);
+    reader.setReaction([&told] { told.order.emplace_back("callback"); });
+    const LoopThread thread;
+    thread.call([&] {
+        reader.registerWith(device);
+        EXPECT_EQ(device.schedule(thread.loop(), kMode), VEXA_STATUS_SUCCESS);
+    });
+    const Bytes longer = {1, 2, 3, 4, 5, 6};
+    ASSERT_EQ(::send(ends[1], longer.data(), longer.size(), 0), 6);
+    ASSERT_EQ(::send(ends[1], nullptr, 0, 0), 0);
+    told.done.wait();
+    thread.call([&] { device.unschedule(thread.loop(), kMode); });
+    EXPECT_THAT(told.order,
+                ElementsAre("arrived", "callback", "handled", "arrived", "callback", "handled"));
+    ASSERT_THAT(told.arrived, SizeIs(2));
+    const std::vector<Seen> seen = reader.seen();
+    for (std::size_t i = 0; i < 2; ++i) {
+        EXPECT_EQ(told.arrived[i].bytes, seen[i].bytes);
+        EXPECT_EQ(told.arrived[i].timestamp, seen[i].timestamp);
+    }
+    EXPECT_EQ(told.arrived[0].bytes, (Bytes{1, 2, 3, 4}));
+    vexa_service_unregister(service);
     ::close(ends[1]);
 }
 

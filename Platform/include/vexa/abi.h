@@ -45,7 +45,7 @@
 /* The ABI that these headers describe. The major number changes when something breaks, the minor
  * one when something is added. */
 #define VEXA_ABI_MAJOR 1u
-#define VEXA_ABI_MINOR 0u
+#define VEXA_ABI_MINOR 1u
 #define VEXA_ABI_VERSION ((VEXA_ABI_MAJOR << 16) | VEXA_ABI_MINOR)
 
 VEXA_BEGIN_C

@@ -1,0 +1,154 @@
+#include "Tools/AppendTarget.h"
+
+#include "Tools/Failure.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstdlib>
+#include <filesystem>
+#include <system_error>
+#include <utility>
+
+namespace VexaTouch::Tools {
+namespace {
+
+constexpr unsigned kNewFileMode = 0666;  // less the process's mask
+
+[[noreturn]] void fail(const std::string& name, int error) {
+    throw Failure(name + ": cannot write: " + std::generic_category().message(error));
+}
+
+/// A descriptor: of a regular file, or of what is written in sequence.
+class DescriptorTarget final : public AppendTarget {
+public:
+    DescriptorTarget(FileDescriptor descriptor, bool isRegular) noexcept
+        : descriptor_(std::move(descriptor)), isRegular_(isRegular) {}
+
+    [[nodiscard]] bool isRewritable() const noexcept override { return isRegular_; }
+
+    Result write(std::uint64_t offset, std::string_view text) noexcept override {
+        Result result;
+        while (result.written < text.size()) {
+            const std::string_view left = text.substr(result.written);
+            const ssize_t count = isRegular_ ? ::pwrite(descriptor_.get(), left.data(), left.size(),
+                                                        static_cast<off_t>(offset + result.written))
+                                             : ::write(descriptor_.get(), left.data(), left.size());
+            if (count >= 0) {
+                result.written += static_cast<std::size_t>(count);
+            } else if (errno != EINTR) {
+                result.error = errno;
+                break;
+            }
+        }
+        return result;
+    }
+
+    int cut(std::uint64_t offset) noexcept override {
+        return ::ftruncate(descriptor_.get(), static_cast<off_t>(offset)) == 0 ? 0 : errno;
+    }
+
+    int sync() noexcept override {
+        if (::fdatasync(descriptor_.get()) == 0 || errno == EINVAL || errno == EROFS) {
+            return 0;  // or there is nothing that could be done
+        }
+        return errno;
+    }
+
+    int close() noexcept override { return ::close(descriptor_.release()) == 0 ? 0 : errno; }
+
+private:
+    FileDescriptor descriptor_;
+    bool isRegular_;
+};
+
+/// The result stream. Each write is there for its reader when it returns.
+class StreamTarget final : public AppendTarget {
+public:
+    explicit StreamTarget(std::ostream& stream) noexcept : stream_(stream) {}
+
+    [[nodiscard]] bool isRewritable() const noexcept override { return false; }
+
+    Result write(std::uint64_t, std::string_view text) noexcept override {
+        errno = 0;
+        stream_.write(text.data(), static_cast<std::streamsize>(text.size())).flush();
+        if (stream_.good()) {
+            return {.written = text.size(), .error = 0};
+        }
+        return {.written = 0, .error = errno != 0 ? errno : EIO};
+    }
+    int cut(std::uint64_t) noexcept override { return 0; }
+    int sync() noexcept override { return 0; }
+    int close() noexcept override { return 0; }
+
+private:
+    std::ostream& stream_;
+};
+
+/// A new file beside the old one, under a name of its own.
+FileDescriptor makeBeside(const std::filesystem::path& target, std::string& name) {
+    name = target.parent_path() / ("." + target.filename().string() + ".XXXXXX");
+    return FileDescriptor(::mkostemp(name.data(), O_CLOEXEC));
+}
+
+std::unique_ptr<AppendTarget> replaceFile(const std::string& path, const struct stat& old) {
+    // A link keeps pointing where it points.
+    std::error_code error;
+    const std::filesystem::path target = std::filesystem::canonical(path, error);
+    if (error) {
+        fail(path, error.value());
+    }
+    if (::access(target.c_str(), W_OK) != 0) {
+        fail(path, errno);
+    }
+    std::string name;
+    FileDescriptor descriptor = makeBeside(target, name);
+    if (!descriptor) {
+        fail(path, errno);
+    }
+    // Best effort: the file stays as readable as it was.
+    static_cast<void>(::fchmod(descriptor.get(), old.st_mode & 07777U) == 0);
+    if (::rename(name.c_str(), target.c_str()) != 0) {
+        const int reason = errno;
+        ::unlink(name.c_str());
+        fail(path, reason);
+    }
+    return std::make_unique<DescriptorTarget>(std::move(descriptor), true);
+}
+
+}  // namespace
+
+std::unique_ptr<AppendTarget> openAppendTarget(const std::string& path, bool replace,
+                                               Streams& streams) {
+    if (path == "-") {
+        return std::make_unique<StreamTarget>(streams.out);
+    }
+    FileDescriptor made(
+        ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNewFileMode));
+    if (made) {
+        return std::make_unique<DescriptorTarget>(std::move(made), true);
+    }
+    const int reason = errno;
+    struct stat old{};
+    if (reason != EEXIST || ::stat(path.c_str(), &old) != 0) {
+        fail(path, reason == EEXIST ? errno : reason);
+    }
+    if (S_ISREG(old.st_mode) && old.st_size > 0) {
+        if (!replace) {
+            throw Failure(path +
+                          ": is there already and would be lost (--force replaces it, another "
+                          "name keeps it)");
+        }
+        return replaceFile(path, old);
+    }
+    FileDescriptor opened(::open(path.c_str(), O_WRONLY | O_CLOEXEC));
+    if (!opened) {
+        fail(path, errno);
+    }
+    return std::make_unique<DescriptorTarget>(std::move(opened), S_ISREG(old.st_mode));
+}
+
+}  // namespace VexaTouch::Tools

@@ -1,0 +1,105 @@
+#pragma once
+
+#include "Host/HostSession.h"
+#include "Host/PluginLibrary.h"
+#include "Platform/DeviceBackend.h"
+#include "Tools/FrameFeed.h"
+#include "Tools/InputTap.h"
+#include "Tools/PlayedDevice.h"
+#include "Tools/RecordingStream.h"
+#include "Tools/SettingKeys.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/Streams.h"
+#include "Tools/WakeUp.h"
+
+#include <atomic>
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <vector>
+
+namespace VexaTouch::Tools {
+
+/// How a device is recorded.
+struct RecordRunOptions {
+    std::vector<Setting> settings = {};  ///< given to the service before it is scheduled
+    std::optional<std::chrono::nanoseconds> duration = {};
+    std::optional<std::uint64_t> count = {};  ///< of input reports
+    /// Room for what the disk does not take at once.
+    std::size_t feedBytes = FrameFeed::kUsualBytes;
+    /// The device plays no faster than the file is written. Without, it goes on like one that is
+    /// made of glass, and what finds no room is lost.
+    bool holdBack = true;
+};
+
+/// What a recording holds when it ends.
+struct RecordSummary {
+    std::uint64_t reports = 0;
+    std::uint64_t settings = 0;
+    FrameGap lost;  ///< because the file was not written quickly enough
+};
+
+/// A service with a device of its own whose every input goes into a file, for as long as that
+/// takes. It ends when the device has played everything or is gone, after a time, after a number
+/// of reports, at a signal, or when the file cannot be written any more.
+///
+/// The thread that runs it writes; the input thread and the device's player never wait for it.
+class RecordRun {
+public:
+    /// Walks the plug-in's life up to its event callback and gives it the settings. `sink` gets the
+    /// events, on the session's queue. `signals` and `wake` belong together. Everything given must
+    /// outlive the run. Throws HostFailure and Failure.
+    RecordRun(const Host::PluginLibrary& library, const std::shared_ptr<PlayedDevice>& device,
+              RecordRunOptions options, Host::HostSession::EventSink sink, SignalWatch& signals,
+              const WakeUp& wake, Streams& streams);
+    ~RecordRun();
+    RecordRun(const RecordRun&) = delete;
+    RecordRun(RecordRun&&) = delete;
+    RecordRun& operator=(const RecordRun&) = delete;
+    RecordRun& operator=(RecordRun&&) = delete;
+
+    /// Runs to the end, the whole teardown included, and finishes the stream. Once. Throws
+    /// HostFailure and Failure, also when the device was unplugged; the stream is finished then as
+    /// far as it can be.
+    RecordSummary run(RecordingStream& stream);
+
+private:
+    using Time = std::chrono::steady_clock::time_point;
+
+    void installHooks();
+    [[nodiscard]] bool isOver() const;
+    void waitForWork() const;
+    bool takeFrames();
+    void holdBack() noexcept;
+    void endHoldBack() noexcept;
+    void take(const RecordedFrame& frame);
+    void take(const FrameGap& gap);
+    void drawProgress(bool last);
+
+    std::shared_ptr<PlayedDevice> device_;
+    RecordRunOptions options_;
+    SignalWatch& signals_;
+    const WakeUp& wake_;
+    Streams& streams_;
+    std::shared_ptr<InputTap> tap_;
+    std::shared_ptr<FrameFeed> feed_;
+    FrameDecoder decoder_;
+    RecordingStream* stream_ = nullptr;  // while it runs
+    RecordSummary summary_;
+    std::uint64_t latestNs_ = 0;
+    std::optional<Time> deadline_;
+    Time start_;
+    Time nextDraw_;
+    // The device's player waits for the second to change while the first is false.
+    std::atomic<bool> noHoldBack_;
+    std::atomic<std::uint32_t> turns_ = 0;
+    // Set by the device's threads.
+    std::atomic<bool> finished_ = false;
+    std::atomic<bool> unplugged_ = false;
+    Vexa::DeviceRegistration registration_;
+    Host::HostSession session_;
+};
+
+}  // namespace VexaTouch::Tools
