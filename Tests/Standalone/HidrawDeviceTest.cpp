@@ -237,8 +237,8 @@ TEST_F(HidrawDeviceTest, SaysWhyAFeatureReportFailed) {
     devices_.plug(0);
     HidrawDevice device("/dev/hidraw0");
     const std::vector<std::pair<int, vexa_status>> outcomes = {
-        {EIO, VEXA_STATUS_IO_ERROR},      {EPIPE, VEXA_STATUS_IO_ERROR},
-        {ETIMEDOUT, VEXA_STATUS_IO_ERROR}, {EINVAL, VEXA_STATUS_IO_ERROR},
+        {EIO, VEXA_STATUS_IO_ERROR},        {EPIPE, VEXA_STATUS_IO_ERROR},
+        {ETIMEDOUT, VEXA_STATUS_IO_ERROR},  {EINVAL, VEXA_STATUS_IO_ERROR},
         {ENOMEM, VEXA_STATUS_NO_RESOURCES}, {ENOSYS, VEXA_STATUS_UNSUPPORTED},
     };
     for (const auto& [error, status] : outcomes) {

@@ -47,8 +47,8 @@ struct MockedAnswer {
     int error = 0;                    ///< an errno instead
 };
 
-/// HID devices that are made up: a /sys, a /dev and udev events of their own, hidraw nodes that give
-/// reports and answer ioctls, for all code of the process. Needs the interposing library of
+/// HID devices that are made up: a /sys, a /dev and udev events of their own, hidraw nodes that
+/// give reports and answer ioctls, for all code of the process. Needs the interposing library of
 /// umockdev, with which the build links every test that includes this.
 ///
 /// A node is a terminal in raw mode: what is sent before the reader reads comes as one report, so
@@ -69,22 +69,20 @@ public:
 
     static std::string nodeOf(unsigned number) { return "/dev/hidraw" + std::to_string(number); }
 
-    /// Plugs a device in as /dev/hidraw<number>; its event comes with announce(). The path in /sys,
-    /// another one for each plugging.
+    /// Plugs a device in as /dev/hidraw<number> and sends the event. The path in /sys, another one
+    /// for each plugging.
     std::string plug(unsigned number, const MockedIdentity& identity = {}) {
-        const std::string hid = "/devices/virtual/misc/uhid/" +
-                                hex(identity.bus) + ':' + hex(identity.vendor) + ':' +
-                                hex(identity.product) + '.' + hex(++instances_);
+        const std::string hid = "/devices/virtual/misc/uhid/" + hex(identity.bus) + ':' +
+                                hex(identity.vendor) + ':' + hex(identity.product) + '.' +
+                                hex(++instances_);
         const std::string name = "hidraw" + std::to_string(number);
-        std::string text = "P: " + hid + "/hidraw/" + name +
-                           "\nE: SUBSYSTEM=hidraw\nE: DEVNAME=/dev/" + name +
-                           "\nE: MAJOR=240\nE: MINOR=" + std::to_string(number) +
-                           "\n\nP: " + hid +
-                           "\nE: SUBSYSTEM=hid\nE: HID_ID=" + hex(identity.bus) + ":0000" +
-                           hex(identity.vendor) + ":0000" + hex(identity.product) +
-                           "\nE: HID_NAME=" + identity.name + "\nE: HID_PHYS=" +
-                           identity.physicalPath + "\nE: HID_UNIQ=" + identity.serial +
-                           "\nH: report_descriptor=" + hexBytes(identity.descriptor) + '\n';
+        std::string text =
+            "P: " + hid + "/hidraw/" + name + "\nE: SUBSYSTEM=hidraw\nE: DEVNAME=/dev/" + name +
+            "\nE: MAJOR=240\nE: MINOR=" + std::to_string(number) + "\n\nP: " + hid +
+            "\nE: SUBSYSTEM=hid\nE: HID_ID=" + hex(identity.bus) + ":0000" + hex(identity.vendor) +
+            ":0000" + hex(identity.product) + "\nE: HID_NAME=" + identity.name +
+            "\nE: HID_PHYS=" + identity.physicalPath + "\nE: HID_UNIQ=" + identity.serial +
+            "\nH: report_descriptor=" + hexBytes(identity.descriptor) + '\n';
         GError* error = nullptr;
         require(umockdev_testbed_add_from_string(testbed_, text.c_str(), &error) != 0, error);
         auto device = std::make_unique<Device>();
@@ -102,8 +100,8 @@ public:
         devices_[number] = std::move(device);
         return sysPath;
     }
-    /// Sends udev's event: "add", "change".
-    void announce(unsigned number, const char* action = "add") {
+    /// Sends a further event.
+    void announce(unsigned number, const char* action) {
         umockdev_testbed_uevent(testbed_, devices_.at(number)->sysPath.c_str(), action);
     }
     /// Pulls the plug: readers hang up, ioctls fail, the folders in /sys go, then comes the event.
@@ -256,8 +254,8 @@ private:
     static int answerLocked(Device& device, UMockdevIoctlClient* client, unsigned long request) {
         const std::size_t size = _IOC_SIZE(request);
         GError* error = nullptr;
-        UMockdevIoctlData* const data = umockdev_ioctl_data_resolve(
-            umockdev_ioctl_client_get_arg(client), 0, size, &error);
+        UMockdevIoctlData* const data =
+            umockdev_ioctl_data_resolve(umockdev_ioctl_client_get_arg(client), 0, size, &error);
         require(data != nullptr, error);
         const int result = answerWith(device, data, request, size);
         umockdev_ioctl_data_unref(data);
@@ -302,10 +300,9 @@ private:
                 return 0;
             }
             case _IOC_NR(HIDIOCGRAWINFO): {
-                const hidraw_devinfo info{
-                    .bustype = identity.bus,
-                    .vendor = static_cast<std::int16_t>(identity.vendor),
-                    .product = static_cast<std::int16_t>(identity.product)};
+                const hidraw_devinfo info{.bustype = identity.bus,
+                                          .vendor = static_cast<std::int16_t>(identity.vendor),
+                                          .product = static_cast<std::int16_t>(identity.product)};
                 fill(data, room, &info, sizeof info);
                 return 0;
             }
