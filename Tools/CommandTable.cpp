@@ -1,6 +1,7 @@
 #include "Tools/CommandTable.h"
 
 #include "Tools/ConvertCommand.h"
+#include "Tools/DevicesCommand.h"
 #include "Tools/DiffCommand.h"
 #include "Tools/GetCommand.h"
 #include "Tools/InfoCommand.h"
@@ -21,8 +22,9 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &runCommand,  &getCommand,  &setCommand,     &latencyCommand, &validateCommand, &replayCommand,
-    &infoCommand, &showCommand, &convertCommand, &synthCommand,   &diffCommand,
+    &runCommand,     &devicesCommand,  &getCommand,    &setCommand,
+    &latencyCommand, &validateCommand, &replayCommand, &infoCommand,
+    &showCommand,    &convertCommand,  &synthCommand,  &diffCommand,
 };
 
 }  // namespace
