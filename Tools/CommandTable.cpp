@@ -1,6 +1,7 @@
 #include "Tools/CommandTable.h"
 
 #include "Tools/ConvertCommand.h"
+#include "Tools/DevicesCommand.h"
 #include "Tools/DiffCommand.h"
 #include "Tools/GetCommand.h"
 #include "Tools/InfoCommand.h"
@@ -23,9 +24,9 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &runCommand,     &recordCommand,   &getCommand,    &setCommand,  &keysCommand,
-    &latencyCommand, &validateCommand, &replayCommand, &infoCommand, &showCommand,
-    &convertCommand, &synthCommand,    &diffCommand,
+    &runCommand,  &recordCommand,  &devicesCommand,  &getCommand,    &setCommand,
+    &keysCommand, &latencyCommand, &validateCommand, &replayCommand, &infoCommand,
+    &showCommand, &convertCommand, &synthCommand,    &diffCommand,
 };
 
 }  // namespace

@@ -24,8 +24,9 @@ constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "FILE", .help = "Where the recording goes; - writes to standard output"},
 }};
 
-constexpr std::array<OptionEntry, 10> kOptions = {{
+constexpr std::array<OptionEntry, 11> kOptions = {{
     kDeviceOption,
+    kMatchOption,
     {.name = "--set",
      .valueName = "KEY=VALUE",
      .help = "Give the service a setting before it is scheduled; the value is JSON",
@@ -119,6 +120,7 @@ int runRecord(const Arguments& arguments, Streams& streams) {
     const std::string file = arguments.value("FILE");
     const DeviceChoice choice = DeviceChoice::parse(arguments.value(kDeviceOption.name));
     const DeviceWishes wishes = deviceWishes(arguments, choice);
+    options.holdBack = choice.kind != DeviceChoice::Kind::Hidraw;
     const LogOptions logging(arguments.values(kLogOption.name));
     // Signals are set up before there is any other thread, so that none is bothered by them.
     const WakeUp wake;

@@ -29,7 +29,7 @@ RecordedFrame gapFrame(const char* key, std::uint64_t count, std::uint64_t times
 }  // namespace
 
 RecordRun::RecordRun(const Host::PluginLibrary& library,
-                     const std::shared_ptr<PlayedDevice>& device, RecordRunOptions options,
+                     const std::shared_ptr<ObservedDevice>& device, RecordRunOptions options,
                      Host::HostSession::EventSink sink, SignalWatch& signals, const WakeUp& wake,
                      Streams& streams)
     : device_(device),
@@ -58,7 +58,7 @@ RecordRun::~RecordRun() {
 }
 
 void RecordRun::installHooks() {
-    PlayedHooks hooks;
+    DeviceHooks hooks;
     hooks.onStateFrame = [this](const std::string& key, const Vexa::PropertyValue& value) {
         tap_->setProperty(session_, std::string(kPipelineDomain) + key, value);
     };
@@ -109,7 +109,7 @@ bool RecordRun::isOver() const {
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
 
-void RecordRun::waitForWork() const {
+void RecordRun::waitForWork() {
     std::optional<Time> until = deadline_;
     const auto noLaterThan = [&until](Time time) { until = until ? std::min(*until, time) : time; };
     if (streams_.errorIsTerminal) {
@@ -118,7 +118,9 @@ void RecordRun::waitForWork() const {
     if (const auto due = stream_->syncDue()) {
         noLaterThan(*due);
     }
-    wake_.wait(until);
+    if (wake_.wait(until, device_->hangUpDescriptor())) {
+        unplugged_ = true;
+    }
 }
 
 bool RecordRun::takeFrames() {

@@ -5,7 +5,7 @@
 #include "Platform/DeviceBackend.h"
 #include "Tools/FrameFeed.h"
 #include "Tools/InputTap.h"
-#include "Tools/PlayedDevice.h"
+#include "Tools/ObservedDevice.h"
 #include "Tools/RecordingStream.h"
 #include "Tools/SettingKeys.h"
 #include "Tools/SignalWatch.h"
@@ -29,8 +29,8 @@ struct RecordRunOptions {
     std::optional<std::uint64_t> count = {};  ///< of input reports
     /// Room for what the disk does not take at once.
     std::size_t feedBytes = FrameFeed::kUsualBytes;
-    /// The device plays no faster than the file is written. Without, it goes on like one that is
-    /// made of glass, and what finds no room is lost.
+    /// The device plays no faster than the file is written: for played devices only, since a live
+    /// one would hold up the input thread. Without, what finds no room is lost.
     bool holdBack = true;
 };
 
@@ -51,7 +51,7 @@ public:
     /// Walks the plug-in's life up to its event callback and gives it the settings. `sink` gets the
     /// events, on the session's queue. `signals` and `wake` belong together. Everything given must
     /// outlive the run. Throws HostFailure and Failure.
-    RecordRun(const Host::PluginLibrary& library, const std::shared_ptr<PlayedDevice>& device,
+    RecordRun(const Host::PluginLibrary& library, const std::shared_ptr<ObservedDevice>& device,
               RecordRunOptions options, Host::HostSession::EventSink sink, SignalWatch& signals,
               const WakeUp& wake, Streams& streams);
     ~RecordRun();
@@ -70,7 +70,7 @@ private:
 
     void installHooks();
     [[nodiscard]] bool isOver() const;
-    void waitForWork() const;
+    void waitForWork();
     bool takeFrames();
     void holdBack() noexcept;
     void endHoldBack() noexcept;
@@ -78,7 +78,7 @@ private:
     void take(const FrameGap& gap);
     void drawProgress(bool last);
 
-    std::shared_ptr<PlayedDevice> device_;
+    std::shared_ptr<ObservedDevice> device_;
     RecordRunOptions options_;
     SignalWatch& signals_;
     const WakeUp& wake_;

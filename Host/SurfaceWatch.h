@@ -1,0 +1,73 @@
+#pragma once
+
+#include "Host/Surface.h"
+#include "Host/SurfaceMatch.h"
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace VexaTouch::Host {
+
+/// A surface has come or gone.
+struct SurfaceChange {
+    enum class Kind : std::uint8_t { Added, Removed };
+
+    Kind kind = Kind::Added;
+    Surface surface;
+
+    friend bool operator==(const SurfaceChange&, const SurfaceChange&) = default;
+};
+
+/// Finds surfaces: those that are there and those that come and go. It has no thread and no timer;
+/// while nothing is plugged or unplugged it does nothing at all. One thread.
+///
+/// It acts on udev's events, which come when udev has set a node's permissions. Where udev does not
+/// run (/run/udev/control is missing) the kernel's own events must do; whoever sets permissions
+/// there does so without telling.
+class SurfaceWatch {
+public:
+    enum class Events : std::uint8_t {
+        Automatic,  ///< udev's where it runs, else the kernel's
+        Udev,
+        Kernel,
+    };
+
+    /// Throws HostFailure when the system gives no list or no events.
+    explicit SurfaceWatch(SurfaceMatch match, Events events = Events::Automatic);
+    ~SurfaceWatch();
+    SurfaceWatch(const SurfaceWatch&) = delete;
+    SurfaceWatch(SurfaceWatch&&) = delete;
+    SurfaceWatch& operator=(const SurfaceWatch&) = delete;
+    SurfaceWatch& operator=(SurfaceWatch&&) = delete;
+
+    /// Poll it for POLLIN, then take the changes. It stays the same and is the watch's own.
+    [[nodiscard]] int descriptor() const noexcept;
+    /// What has changed since the last time, in the order in which it did; the first time all that
+    /// is there, by node. Never blocks. When events were lost because nobody took them, the list is
+    /// made anew and compared. Throws HostFailure when that fails.
+    [[nodiscard]] std::vector<SurfaceChange> takeChanges();
+
+    /// Automatic is what it turned out to be.
+    [[nodiscard]] Events events() const noexcept { return events_; }
+
+private:
+    class Udev;
+
+    void enumerate(std::vector<SurfaceChange>& changes);
+    void takeEvents(std::vector<SurfaceChange>& changes);
+
+    const SurfaceMatch match_;
+    Events events_;
+    std::unique_ptr<Udev> udev_;
+    std::map<std::string, Surface, std::less<>> known_;  // by path in /sys
+    bool mustEnumerate_ = true;
+};
+
+/// All that match and are there now, by node. Throws HostFailure.
+std::vector<Surface> findSurfaces(const SurfaceMatch& match);
+
+}  // namespace VexaTouch::Host
