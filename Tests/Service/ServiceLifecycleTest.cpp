@@ -156,12 +156,17 @@ TEST_F(ServiceLifecycleTest, UnschedulingLeavesProbesAndDeviceBehind) {
     EXPECT_EQ(stand.service.get("DisjointImageCount"), PropertyValue(0U));
 }
 
-TEST_F(ServiceLifecycleTest, UnschedulingWithoutAThreadOnlyLetsTheQueueGo) {
-    const LiveObjects before = LiveObjects::now();
+TEST_F(ServiceLifecycleTest, UnschedulingWhatWasNeverScheduledDoesNothing) {
+    const LeakCheck leaks;
     stand.service.unschedule({});
     stand.service.unschedule(stand.queue);
     stand.service.unschedule(stand.queue);
-    EXPECT_EQ(LiveObjects::now(), before);
+    leaks.expectNothingLeft();
+    EXPECT_EQ(stand.service.references(), 2U);
+    stand.startUp();
+    EXPECT_TRUE(stand.feed({firmwareReport(0)}));
+    EXPECT_EQ(stand.events.take().size(), 1U);
+    stand.tearDown();
 }
 
 TEST_F(ServiceLifecycleTest, TheQueueIsHeldWhileScheduled) {
