@@ -124,6 +124,19 @@ TEST_F(InputReportTest, EachArrivalIsLoggedWithItsTime) {
     EXPECT_EQ(arrivals, 2U);
 }
 
+TEST_F(InputReportTest, AnArrivalIsLoggedBeforeItsProbes) {
+    LogCapture log;
+    ASSERT_TRUE(stand.feed({{9}, firmwareReport(1)}));
+    std::vector<LogLine> lines = log.take();
+    for (LogLine& line : lines) line.text = line.text.substr(0, line.text.find(", timestampMach"));
+    EXPECT_THAT(lines,
+                ElementsAre(debug("Received input report (type 0, reportID 9, reportLength 1"),
+                            debug("Input report probe"), debug("Invalid input report with ID 9"),
+                            debug("Received input report (type 0, reportID 2, reportLength 10"),
+                            debug("Input report probe"),
+                            info("Firmware event probe; event: 1, context: 0")));
+}
+
 TEST_F(InputReportTest, InvalidReportsAreLogged) {
     LogCapture log;
     ASSERT_TRUE(stand.feed({{}, {7}, {1, 2}, {2, 0}}));
