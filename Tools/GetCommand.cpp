@@ -123,7 +123,8 @@ int runGet(const Arguments& arguments, Streams& streams) {
     const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
     DeviceWishes wishes{.announceSeed = false};
     wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
-    HostedDevice hosted(makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {});
+    HostedDevice hosted(
+        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
     hosted.begin();
     if (!choice.path.empty()) {
         hosted.waitUntilPlayed();

@@ -1,12 +1,16 @@
 #include "Tools/HostedDevice.h"
 
+#include "Tools/Failure.h"
+
 #include <string>
 #include <utility>
 
 namespace VexaTouch::Tools {
 
-HostedDevice::HostedDevice(std::shared_ptr<PlayedDevice> device, Host::HostSession::EventSink sink)
+HostedDevice::HostedDevice(std::shared_ptr<PlayedDevice> device, Host::HostSession::EventSink sink,
+                           std::chrono::nanoseconds patience)
     : device_(std::move(device)),
+      patience_(patience),
       registration_(device_),
       library_(Host::PluginLibrary::loadDefault()),
       session_(library_, registration_.service(), std::move(sink)) {}
@@ -19,6 +23,15 @@ void HostedDevice::begin(PlayedHooks hooks) {
     device_->setHooks(std::move(hooks));
     static_cast<void>(finished_.try_acquire());  // left over from the last time
     session_.begin();
+}
+
+void HostedDevice::waitUntilPlayed() {
+    ReportWatch watch(*device_, patience_);
+    while (!finished_.try_acquire_for(watch.interval())) {
+        if (watch.look()) {
+            throw Failure(ReportWatch::kFault);
+        }
+    }
 }
 
 }  // namespace VexaTouch::Tools

@@ -128,6 +128,18 @@ private:
     std::thread thread_;
 };
 
+/// Halts a device before what its hooks and its sink use goes away, whatever happens.
+class HaltedInTheEnd {
+public:
+    explicit HaltedInTheEnd(HostedDevice& device) noexcept : device_(device) {}
+    ~HaltedInTheEnd() { device_.halt(); }
+    HaltedInTheEnd(const HaltedInTheEnd&) = delete;
+    HaltedInTheEnd& operator=(const HaltedInTheEnd&) = delete;
+
+private:
+    HostedDevice& device_;
+};
+
 LatencyResult resultOf(const LatencyProbe& probe, const ReaderTurns& turns, bool withReader,
                        const RecordingReader& reader) {
     LatencyResult result;
@@ -156,11 +168,14 @@ std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options) {
         PlayedPace{.speed = std::numeric_limits<double>::infinity()}, SurfaceIdentity{},
         Vexa::HostClock::system());
     std::atomic<LatencyProbe*> listening = nullptr;
-    HostedDevice hosted(device, [&listening](const Vexa::HidEvent& event) {
-        if (LatencyProbe* probe = listening.load()) {
-            probe->delivered(event);
-        }
-    });
+    HostedDevice hosted(
+        device,
+        [&listening](const Vexa::HidEvent& event) {
+            if (LatencyProbe* probe = listening.load()) {
+                probe->delivered(event);
+            }
+        },
+        options.patience);
     hosted.begin();
     hosted.waitUntilPlayed();
     hosted.halt();
@@ -181,6 +196,7 @@ std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options) {
         ++next;
         send(report);
     };
+    const HaltedInTheEnd halted(hosted);
     hosted.begin(std::move(hooks));
     hosted.waitUntilPlayed();
     reader.finish();

@@ -5,6 +5,7 @@
 #include "Tools/PlayedDevice.h"
 
 #include <array>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
@@ -28,6 +29,7 @@ struct LatencyRunOptions {
     std::size_t reports = 10'000;  ///< that are measured, of each result
     LatencyReader reader = LatencyReader::Off;
     bool mayBeRealTime = true;
+    std::chrono::nanoseconds patience = std::chrono::seconds(5);  ///< with a service that is stuck
 };
 
 struct LatencyResult {
@@ -42,7 +44,7 @@ struct LatencyResult {
 
 /// Runs a service of its own on a device of its own: fills the recording, then sends the reports at
 /// their rate and measures. Two results, the first without the reader, when it takes turns. Throws
-/// HostFailure.
+/// HostFailure, and Failure when the service takes no reports.
 std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options);
 
 }  // namespace VexaTouch::Tools

@@ -44,6 +44,7 @@ LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<Playe
       streams_(streams),
       startNs_(Util::nanosecondsFromMachTime(nowTicks())),
       inbox_(wake),
+      watch_(*device, streams.patience),
       registration_(device),
       session_(library, registration_.service(), [this](const Vexa::HidEvent& event) {
           inbox_.put(DeliveredEvent::of(event, nowTicks()));
@@ -86,9 +87,11 @@ void LiveRun::installHooks() {
 
 void LiveRun::run() {
     session_.begin();
+    const Time start = std::chrono::steady_clock::now();
     if (options_.duration) {
-        deadline_ = std::chrono::steady_clock::now() + *options_.duration;
+        deadline_ = start + *options_.duration;
     }
+    nextLook_ = start + watch_.interval();
     if (surface_) {
         screen_ = std::make_unique<LiveScreen>(streams_);
     } else if (!options_.json) {
@@ -109,18 +112,24 @@ void LiveRun::run() {
     if (unplugged_) {
         throw Failure("the device was unplugged");
     }
+    if (stuck_) {
+        throw Failure(ReportWatch::kFault);
+    }
 }
 
 bool LiveRun::isOver() const {
-    return finished_ || unplugged_ || quit_ || signals_.endWanted() || !streams_.out.good() ||
-           (options_.count && totals_.events >= *options_.count) ||
+    return finished_ || unplugged_ || quit_ || stuck_ || signals_.endWanted() ||
+           !streams_.out.good() || (options_.count && totals_.events >= *options_.count) ||
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
 
 void LiveRun::waitForWork() const {
-    std::optional<Time> until = deadline_;
+    Time until = nextLook_;
+    if (deadline_) {
+        until = std::min(until, *deadline_);
+    }
     if (screen_) {
-        until = until ? std::min(*until, nextDraw_) : nextDraw_;
+        until = std::min(until, nextDraw_);
     }
     wake_.wait(until);
 }
@@ -132,6 +141,15 @@ void LiveRun::handleWork() {
         draw(false);
     }
     writeRecordingOnWish();
+    lookAfterReports();
+}
+
+void LiveRun::lookAfterReports() {
+    const Time now = std::chrono::steady_clock::now();
+    if (now >= nextLook_) {
+        nextLook_ = now + watch_.interval();
+        stuck_ = watch_.look();
+    }
 }
 
 void LiveRun::takeEvents() {

@@ -62,8 +62,8 @@ constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
      "ended in order: everything was played, the time or number was reached, or a signal asked for "
      "it"},
     {kExitFailure,
-     "the plug-in or the device cannot be used, the device was unplugged, or results could not be "
-     "written"},
+     "the plug-in or the device cannot be used, the service takes no reports for five seconds, the "
+     "device was unplugged, or results could not be written"},
     {kExitUsage, "the command line is wrong, an unknown setting included"},
 }};
 

@@ -83,7 +83,8 @@ int runSet(const Arguments& arguments, Streams& streams) {
     const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
     DeviceWishes wishes{.announceSeed = false};
     wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
-    HostedDevice hosted(makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {});
+    HostedDevice hosted(
+        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
     hosted.begin();
     if (!hosted.session().setProperty(key, value)) {
         throw Failure(key + ": the device did not take the value");

@@ -16,6 +16,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
@@ -42,6 +43,8 @@ using ::testing::StartsWith;
 
 const std::filesystem::path kExamples = VEXA_SOURCE_DIR "/Examples";
 constexpr const char* kVariable = "VEXATOUCH_PLUGIN";
+/// So long a service that never takes a report is waited for.
+constexpr std::chrono::milliseconds kImpatience{10};
 
 /// What happened: each line from its frame number on.
 std::vector<std::string> eventsIn(const std::string& lines) {
@@ -270,6 +273,21 @@ TEST_F(RunCommandTest, WrongCommandLinesAreUsageErrors) {
         EXPECT_EQ(result.exitCode, 2) << text;
         EXPECT_EQ(result.out, "") << text;
         EXPECT_THAT(result.error, StartsWith("vexatouch run: " + text));
+    }
+}
+
+TEST_F(RunCommandTest, ServiceThatTakesNoReportsEndsTheRunInOrder) {
+    setenv(kVariable, VEXATOUCH_SAMPLE_PLUGINS "/TakesNoReports.so", 1);
+    for (const std::string& device : {asFastAsTaken("taps"), std::string("sim")}) {
+        const CommandResult result =
+            runCommand({"run", "--device", device}, {}, Vexa::HostClock::system(), kImpatience);
+        EXPECT_EQ(result.exitCode, 1);
+        EXPECT_EQ(result.out, "     host ms  latency us  event           region\n");
+        EXPECT_THAT(result.error,
+                    MatchesRegex("(simulated surface: random gestures, seed [0-9]+\n)?"
+                                 "[0-9]+ reports? sent, [0-9]+ dropped, 0 events\n"
+                                 "vexatouch run: the service takes no reports; its log says "
+                                 "why\n"));
     }
 }
 
