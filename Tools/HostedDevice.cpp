@@ -1,5 +1,6 @@
 #include "Tools/HostedDevice.h"
 
+#include "Host/RegisteredDevice.h"
 #include "Tools/Failure.h"
 
 #include <string>
@@ -11,7 +12,7 @@ HostedDevice::HostedDevice(std::shared_ptr<PlayedDevice> device, Host::HostSessi
                            std::chrono::nanoseconds patience)
     : device_(std::move(device)),
       patience_(patience),
-      registration_(device_),
+      registration_(Host::registeredDevice(device_)),
       library_(Host::PluginLibrary::loadDefault()),
       session_(library_, registration_.service(), std::move(sink)) {}
 

@@ -1,5 +1,6 @@
 #include "Tools/LiveRun.h"
 
+#include "Host/RegisteredDevice.h"
 #include "Platform/HostClock.h"
 #include "Platform/PropertyValue.h"
 #include "Shared/Util.h"
@@ -45,7 +46,7 @@ LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<Playe
       startNs_(Util::nanosecondsFromMachTime(nowTicks())),
       inbox_(wake),
       watch_(*device, streams.patience),
-      registration_(device),
+      registration_(Host::registeredDevice(device)),
       session_(library, registration_.service(), [this](const Vexa::HidEvent& event) {
           inbox_.put(DeliveredEvent::of(event, nowTicks()));
       }) {
