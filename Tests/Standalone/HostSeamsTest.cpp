@@ -17,11 +17,19 @@
 #include <vexa/device.h>
 #include <vexa/queue.h>
 #include <cstdint>
+#include <cstdlib>
+#include <iostream>
 #include <memory>
+#include <sstream>
 #include <string>
+#include <vector>
 
 namespace {
 
+constexpr std::uint32_t kOtherVersion = 0x0007'0003;
+
+bool abiServes = true;
+std::uint32_t askedFor = 0;
 bool haveQueues = true;
 bool haveHandles = true;
 
@@ -33,6 +41,15 @@ Function* original(const char* name) {
 }  // namespace
 
 extern "C" {
+
+VEXA_API bool vexa_abi_serves(uint32_t built_for) noexcept {
+    askedFor = built_for;
+    return abiServes;
+}
+
+VEXA_API uint32_t vexa_abi_version(void) noexcept {
+    return abiServes ? VEXA_ABI_VERSION : kOtherVersion;
+}
 
 VEXA_API vexa_queue* vexa_queue_create(const char* label) noexcept {
     static const auto create = original<vexa_queue*(const char*)>("vexa_queue_create");
@@ -61,10 +78,18 @@ protected:
     HostSeamsTest() { setenv("VEXATOUCH_PLUGIN", kFile, 1); }
     ~HostSeamsTest() override {
         unsetenv("VEXATOUCH_PLUGIN");
+        abiServes = true;
         haveQueues = true;
         haveHandles = true;
     }
 
+    static std::string versionText(std::uint32_t version) {
+        return std::to_string(version >> 16U) + '.' + std::to_string(version & 0xFFFFU);
+    }
+    /// What is said of a platform of the wrong version.
+    static std::string platformFault() {
+        return "libvexaplatform has ABI 7.3, this program needs " + versionText(VEXA_ABI_VERSION);
+    }
     template <typename Operation>
     static std::string failureOf(const Operation& operation) {
         try {
@@ -75,6 +100,37 @@ protected:
         return "nothing";
     }
 };
+
+TEST_F(HostSeamsTest, APlatformThatDoesNotServeTheHostLoadsNoPlugin) {
+    abiServes = false;
+    EXPECT_EQ(failureOf([] { const Host::PluginLibrary library(kFile); }), platformFault());
+    EXPECT_EQ(askedFor, VEXA_ABI_VERSION);
+    EXPECT_EQ(runCommand({"get", "Version"}),
+              (CommandResult{1, "", "vexatouch get: " + platformFault() + '\n'}));
+    abiServes = true;
+    EXPECT_EQ(failureOf([] { const Host::PluginLibrary library(kFile); }), "nothing");
+}
+
+/// Runs one check of the real plug-in in this process, which it ends when the check fails.
+void validateHere(const std::string& check) {
+    std::istringstream in;
+    Tools::Streams streams{.in = in, .out = std::cerr, .error = std::cerr};
+    std::exit(Tools::CommandLine::run(
+        std::vector<std::string>{"validate", kFile, "--here", "--only", check}, streams));
+}
+
+using HostSeamsDeathTest = HostSeamsTest;
+
+TEST_F(HostSeamsDeathTest, APlatformThatDoesNotServeTheValidatorChecksNoPlugin) {
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    EXPECT_EXIT(validateHere("slots"), ::testing::ExitedWithCode(0), "pass +slots");
+    abiServes = false;
+    for (const std::string check : {"load", "slots", "unload"}) {
+        EXPECT_EXIT(validateHere(check), ::testing::ExitedWithCode(1),
+                    ::testing::ContainsRegex("fail +" + check +
+                                             " .*cannot be checked: " + platformFault()));
+    }
+}
 
 TEST_F(HostSeamsTest, ASessionWithoutAThreadForItsQueueSaysSo) {
     const Host::PluginLibrary library(kFile);
