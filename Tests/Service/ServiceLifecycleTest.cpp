@@ -10,9 +10,11 @@
 #include "Tests/Support/Touch.h"
 
 #include <gmock/gmock.h>
+#include <gtest/gtest-spi.h>
 #include <gtest/gtest.h>
 
 #include <fcntl.h>
+#include <unistd.h>
 #include <array>
 #include <chrono>
 #include <cstddef>
@@ -444,6 +446,8 @@ INSTANTIATE_TEST_SUITE_P(
                                      Step::Stop)),
     faultName);
 
+constexpr const char* kFaultMode = "fault";
+
 /// The statuses behind the service's answers, of another device of the same back-end.
 void expectAnswers(const Answers& answers, std::uint32_t handle, const Vexa::RunLoop& loop) {
     const Vexa::HidDevice device = Vexa::HidDevice::create(handle);
@@ -455,7 +459,7 @@ void expectAnswers(const Answers& answers, std::uint32_t handle, const Vexa::Run
         [](void*, vexa_status, vexa_device*, vexa_report_type, std::uint32_t, const std::uint8_t*,
            std::size_t, std::uint64_t) {},
         nullptr);
-    EXPECT_EQ(device.schedule(loop, "fault"), VEXA_STATUS_SUCCESS);
+    EXPECT_EQ(device.schedule(loop, kFaultMode), VEXA_STATUS_SUCCESS);
     if (answers.open != VEXA_STATUS_SUCCESS) {
         EXPECT_EQ(device.open(0), answers.open);
     }
@@ -464,7 +468,7 @@ void expectAnswers(const Answers& answers, std::uint32_t handle, const Vexa::Run
     EXPECT_EQ(device.featureReport(4, report.data(), length), answers.report);
     EXPECT_EQ(static_cast<bool>(device.property("Product")), answers.reads);
     EXPECT_EQ(device.setProperty("Colour", 1), answers.writes);
-    device.unschedule(loop, "fault");
+    device.unschedule(loop, kFaultMode);
 }
 
 /// Opens the service's device. A descriptor that cannot be waited for is found out only once the
@@ -536,6 +540,8 @@ TEST_P(FaultTest, EndsInTheDocumentedAnswers) {
     const Step step = std::get<Step>(GetParam());
     const LoadedPlugin plugin(VEXATOUCH_PLUGIN_FILE);
     const Vexa::RunLoop loop = Vexa::RunLoop::current();
+    // A loop keeps a descriptor for each mode that it has ever had.
+    loop.run(kFaultMode, 0);
     const LeakCheck leaks;
     {
         const auto device = std::make_shared<StruckDevice>();
@@ -574,11 +580,12 @@ INSTANTIATE_TEST_SUITE_P(Of, UnplugInTheMiddleTest,
                                          ScriptedDevice::kReportHandled),
                          [](const auto& operation) { return std::string(operation.param); });
 
-TEST_P(UnplugInTheMiddleTest, TheLifeEndsInOrder) {
+/// Lives until the device has gone in `operation`.
+void liveWithUnplugIn(std::string_view operation) {
     ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
     stand.device->setFeatureReport(4, {4, 1, 2});
-    stand.device->setHook([&](std::string_view operation) {
-        if (operation == GetParam()) stand.device->unplug();
+    stand.device->setHook([&](std::string_view running) {
+        if (running == operation) stand.device->unplug();
     });
     const ServiceUnderTest& service = stand.service;
     ASSERT_EQ(service.start(stand.registration.service()), 0U);
@@ -596,6 +603,25 @@ TEST_P(UnplugInTheMiddleTest, TheLifeEndsInOrder) {
     stand.queue.drain();
     EXPECT_EQ(service.references(), 2U);
     stand.device->setHook({});
+}
+
+TEST_P(UnplugInTheMiddleTest, TheLifeEndsInOrderAndLeavesNothing) {
+    const LoadedPlugin plugin(VEXATOUCH_PLUGIN_FILE);
+    const LeakCheck leaks;
+    liveWithUnplugIn(GetParam());
+    leaks.expectNothingLeft();
+}
+
+/// A life that ends with one descriptor more than it began with.
+void loseADescriptor() {
+    const LeakCheck leaks;
+    const int lost = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+    leaks.expectNothingLeft();
+    ::close(lost);
+}
+
+TEST(LeakCheckTest, ALostDescriptorIsFound) {
+    EXPECT_NONFATAL_FAILURE(loseADescriptor(), "descriptors");
 }
 
 }  // namespace
