@@ -33,6 +33,7 @@
 namespace VexaTouch::Testing {
 namespace {
 
+using testing::Contains;
 using testing::ElementsAre;
 using Vexa::PropertyValue;
 using Vexa::ScriptedDevice;
@@ -92,10 +93,23 @@ TEST_F(ServiceLifecycleTest, EachOperationLogsItsName) {
 }
 
 TEST_F(ServiceLifecycleTest, NothingIsLoggedAboveDebugInAnOrdinaryLife) {
-    stand.startUp();
     LogCapture log;
+    stand.startUp();
+    const std::size_t threads = threadCount();
+    ASSERT_TRUE(stand.feed({imageReport(nothing(), 1, 10)}));
+    EXPECT_EQ(stand.service.get("Version"), PropertyValue(PropertyValue::Array{13, 0, 0}));
     stand.tearDown();
-    for (const LogLine& line : log.take()) EXPECT_EQ(line.level, Vexa::LogLevel::Debug) << line;
+    ASSERT_TRUE(waitForThreads(threads - 1));
+    const std::vector<LogLine> lines = log.take();
+    for (const LogLine& line : lines) EXPECT_EQ(line.level, Vexa::LogLevel::Debug) << line;
+    // All of the life was seen.
+    EXPECT_EQ(lines.front(), debug("probeWithService:properties:outScore:"));
+    for (const char* text :
+         {"scheduleWithDispatchQueue:", "input report thread start", "openWithOptions:0",
+          "Input report probe", "getPropertyForKey:Version", "closeWithOptions:0",
+          "unscheduleWithDispatchQueue:", "input report thread end", "stop"}) {
+        EXPECT_THAT(lines, Contains(debug(text)));
+    }
 }
 
 TEST_F(ServiceLifecycleTest, StartFailsForAnUnknownHandle) {
