@@ -6,6 +6,9 @@
 #include <pthread.h>
 #include <sched.h>
 
+#include <new>
+#include <stdexcept>
+#include <string>
 #include <utility>
 
 namespace VexaTouch::Host {
@@ -23,13 +26,22 @@ void askForRealTime() noexcept {
     static_cast<void>(pthread_setschedparam(pthread_self(), SCHED_RR, &parameter));
 }
 
+/// What keeps a queue from being made is nearly always a limit on threads.
+Vexa::SerialQueue eventsQueue(const std::string& file) {
+    try {
+        return Vexa::SerialQueue(kQueueLabel);
+    } catch (const std::bad_alloc&) {
+        throw HostFailure(file + ": no thread for the events' queue");
+    }
+}
+
 }  // namespace
 
 HostSession::HostSession(const PluginLibrary& library, std::uint32_t service, EventSink sink,
                          const Vexa::PropertyValue& properties)
     : file_(library.file()),
       sink_(std::move(sink)),
-      queue_(kQueueLabel),
+      queue_(eventsQueue(file_)),
       plugin_(library),
       service_(plugin_.service()) {
     queue_.submit([] { askForRealTime(); });

@@ -31,12 +31,16 @@ void PluginLibrary::Close::operator()(void* library) const noexcept {
     dlclose(library);
 }
 
-PluginLibrary::PluginLibrary(const std::filesystem::path& file)
-    : file_(std::filesystem::absolute(file)) {
+void PluginLibrary::requirePlatform() {
     if (!vexa_abi_serves(VEXA_ABI_VERSION)) {
         throw HostFailure("libvexaplatform has ABI " + versionText(vexa_abi_version()) +
                           ", this program needs " + versionText(VEXA_ABI_VERSION));
     }
+}
+
+PluginLibrary::PluginLibrary(const std::filesystem::path& file)
+    : file_(std::filesystem::absolute(file)) {
+    requirePlatform();
     const std::string name = file_;
     library_.reset(dlopen(name.c_str(), RTLD_NOW | RTLD_LOCAL));
     if (!library_) {

@@ -15,6 +15,8 @@ public:
     /// Loads the file. Throws HostFailure when libvexaplatform does not serve this program, or the
     /// file cannot be loaded or exports no factory.
     explicit PluginLibrary(const std::filesystem::path& file);
+    /// Throws HostFailure when libvexaplatform does not serve this program.
+    static void requirePlatform();
     /// The plug-in at its usual place (PluginPlaces). Throws HostFailure.
     static PluginLibrary loadDefault();
 

@@ -125,7 +125,8 @@ int runGet(const Arguments& arguments, Streams& streams) {
     DeviceWishes wishes{.announceSeed = false};
     wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
     wishes.match = matchOption(arguments, choice);
-    HostedDevice hosted(makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {});
+    HostedDevice hosted(
+        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
     hosted.begin();
     if (choice.ends()) {
         hosted.waitUntilPlayed();

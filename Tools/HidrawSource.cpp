@@ -55,6 +55,7 @@ std::string HidrawSource::tally() const {
 
 vexa_status HidrawSource::open(std::uint32_t options, int& descriptor) noexcept {
     read_.store(0);
+    handled_.store(0);
     return device_.open(options, descriptor);
 }
 
@@ -84,6 +85,7 @@ void HidrawSource::reportArrived(std::span<const std::uint8_t> report,
 }
 
 void HidrawSource::reportHandled() noexcept {
+    handled_.fetch_add(1);
     if (hooks_.onHandled) {
         hooks_.onHandled();
     }

@@ -21,6 +21,8 @@ public:
     [[nodiscard]] int hangUpDescriptor() const noexcept override;
     /// "12 reports read".
     [[nodiscard]] std::string tally() const override;
+    [[nodiscard]] std::uint64_t sent() const noexcept override { return read_.load(); }
+    [[nodiscard]] std::uint64_t handled() const noexcept override { return handled_.load(); }
 
     vexa_status open(std::uint32_t options, int& descriptor) noexcept override;
     vexa_status getReport(vexa_report_type type, std::uint32_t reportId,
@@ -36,6 +38,7 @@ private:
     Vexa::HidrawDevice device_;
     DeviceHooks hooks_;
     std::atomic<std::uint64_t> read_{0};
+    std::atomic<std::uint64_t> handled_{0};
 };
 
 }  // namespace VexaTouch::Tools

@@ -1,14 +1,18 @@
 #include "Tools/HostedDevice.h"
 
+#include "Host/RegisteredDevice.h"
+#include "Tools/Failure.h"
+
 #include <string>
 #include <utility>
 
 namespace VexaTouch::Tools {
 
 HostedDevice::HostedDevice(std::shared_ptr<ObservedDevice> device,
-                           Host::HostSession::EventSink sink)
+                           Host::HostSession::EventSink sink, std::chrono::nanoseconds patience)
     : device_(std::move(device)),
-      registration_(device_),
+      patience_(patience),
+      registration_(Host::registeredDevice(device_)),
       library_(Host::PluginLibrary::loadDefault()),
       session_(library_, registration_.service(), std::move(sink)) {}
 
@@ -20,6 +24,15 @@ void HostedDevice::begin(DeviceHooks hooks) {
     device_->setHooks(std::move(hooks));
     static_cast<void>(finished_.try_acquire());  // left over from the last time
     session_.begin();
+}
+
+void HostedDevice::waitUntilPlayed() {
+    ReportWatch watch(*device_, patience_);
+    while (!finished_.try_acquire_for(watch.interval())) {
+        if (watch.look()) {
+            throw Failure(ReportWatch::kFault);
+        }
+    }
 }
 
 }  // namespace VexaTouch::Tools

@@ -4,7 +4,9 @@
 #include "Host/PluginLibrary.h"
 #include "Platform/DeviceBackend.h"
 #include "Tools/ObservedDevice.h"
+#include "Tools/ReportWatch.h"
 
+#include <chrono>
 #include <memory>
 #include <semaphore>
 
@@ -15,15 +17,17 @@ namespace VexaTouch::Tools {
 class HostedDevice {
 public:
     /// Loads the plug-in from its usual place and walks up to the event callback. `sink` is called
-    /// with each event, on the session's queue. Throws HostFailure.
-    HostedDevice(std::shared_ptr<ObservedDevice> device, Host::HostSession::EventSink sink);
+    /// with each event, on the session's queue; `patience` is how long the service may leave
+    /// reports alone. Throws HostFailure.
+    HostedDevice(std::shared_ptr<ObservedDevice> device, Host::HostSession::EventSink sink,
+                 std::chrono::nanoseconds patience);
 
     /// Schedules and opens: a played device plays from its start. Of the hooks, the state frames'
     /// and the end's are the hosted device's own. Throws HostFailure.
     void begin(DeviceHooks hooks = {});
     /// Returns when a played device has played everything since begin(), and the service handled
-    /// it.
-    void waitUntilPlayed() { finished_.acquire(); }
+    /// it. Throws Failure when the service takes no reports.
+    void waitUntilPlayed();
     /// Closes and unschedules; all events have been delivered when it returns.
     void halt() { session_.halt(); }
     /// Halts, stops and releases. Throws HostFailure when the service does not stop.
@@ -34,6 +38,7 @@ public:
 
 private:
     std::shared_ptr<ObservedDevice> device_;
+    std::chrono::nanoseconds patience_;
     std::binary_semaphore finished_{0};
     Vexa::DeviceRegistration registration_;
     Host::PluginLibrary library_;

@@ -125,6 +125,7 @@ std::size_t reportsOf(const Arguments& arguments, double rate) {
 
 Plan planOf(const Arguments& arguments, Streams& streams) {
     Plan plan;
+    plan.options.patience = streams.patience;
     plan.options.rate = rateOption(arguments, "--rate", kHighestRate).value();
     plan.options.reports = reportsOf(arguments, plan.options.rate);
     const auto reader = choiceOption(arguments, "--reader", "on", "off");

@@ -132,6 +132,18 @@ private:
     std::thread thread_;
 };
 
+/// Halts a device before what its hooks and its sink use goes away, whatever happens.
+class HaltedInTheEnd {
+public:
+    explicit HaltedInTheEnd(HostedDevice& device) noexcept : device_(device) {}
+    ~HaltedInTheEnd() { device_.halt(); }
+    HaltedInTheEnd(const HaltedInTheEnd&) = delete;
+    HaltedInTheEnd& operator=(const HaltedInTheEnd&) = delete;
+
+private:
+    HostedDevice& device_;
+};
+
 LatencyResult resultOf(const LatencyProbe& probe, const ReaderTurns& turns, bool withReader,
                        const RecordingReader& reader) {
     LatencyResult result;
@@ -156,11 +168,15 @@ namespace {
 class Measurement {
 public:
     Measurement(const LatencyRunOptions& options, std::shared_ptr<ObservedDevice> device)
-        : options_(options), hosted_(std::move(device), [this](const Vexa::HidEvent& event) {
-              if (LatencyProbe* probe = listening_.load()) {
-                  probe->delivered(event);
-              }
-          }) {}
+        : options_(options),
+          hosted_(
+              std::move(device),
+              [this](const Vexa::HidEvent& event) {
+                  if (LatencyProbe* probe = listening_.load()) {
+                      probe->delivered(event);
+                  }
+              },
+              options.patience) {}
 
     [[nodiscard]] HostedDevice& hosted() noexcept { return hosted_; }
 

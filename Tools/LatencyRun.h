@@ -36,6 +36,7 @@ struct LatencyRunOptions {
     std::size_t reports = 10'000;  ///< that are measured, of each result
     LatencyReader reader = LatencyReader::Off;
     bool mayBeRealTime = true;
+    std::chrono::nanoseconds patience = std::chrono::seconds(5);  ///< with a service that is stuck
 };
 
 struct LatencyResult {
@@ -50,7 +51,8 @@ struct LatencyResult {
 
 /// Runs a service of its own on a device of its own: fills the recording, then sends the reports at
 /// their rate and measures. On a live device it only measures. Two results, the first without the
-/// reader, when it takes turns. Throws HostFailure, and Failure when a live device is unplugged.
+/// reader, when it takes turns. Throws HostFailure, and Failure when the service takes no reports
+/// or a live device is unplugged.
 std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options);
 
 }  // namespace VexaTouch::Tools

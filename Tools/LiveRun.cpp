@@ -1,5 +1,6 @@
 #include "Tools/LiveRun.h"
 
+#include "Host/RegisteredDevice.h"
 #include "Platform/HostClock.h"
 #include "Platform/PropertyValue.h"
 #include "Shared/Util.h"
@@ -44,7 +45,8 @@ LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<Obser
       streams_(streams),
       startNs_(Util::nanosecondsFromMachTime(nowTicks())),
       inbox_(wake),
-      registration_(device),
+      watch_(*device, streams.patience),
+      registration_(Host::registeredDevice(device)),
       session_(library, registration_.service(), [this](const Vexa::HidEvent& event) {
           const DeliveredEvent delivered = DeliveredEvent::of(event, nowTicks());
           if (keys_) {
@@ -98,9 +100,11 @@ void LiveRun::installHooks() {
 
 void LiveRun::run() {
     session_.begin();
+    const Time start = std::chrono::steady_clock::now();
     if (options_.duration) {
-        deadline_ = std::chrono::steady_clock::now() + *options_.duration;
+        deadline_ = start + *options_.duration;
     }
+    nextLook_ = start + watch_.interval();
     if (surface_) {
         screen_ = std::make_unique<LiveScreen>(streams_);
     } else if (!options_.json) {
@@ -127,22 +131,27 @@ void LiveRun::run() {
     if (unplugged_) {
         throw Failure("the device was unplugged");
     }
+    if (stuck_) {
+        throw Failure(ReportWatch::kFault);
+    }
 }
 
 bool LiveRun::isOver() const {
-    return finished_ || unplugged_ || quit_ || signals_.endWanted() || !streams_.out.good() ||
-           (options_.count && totals_.events >= *options_.count) ||
+    return finished_ || unplugged_ || quit_ || stuck_ || signals_.endWanted() ||
+           !streams_.out.good() || (options_.count && totals_.events >= *options_.count) ||
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
 
 void LiveRun::waitForWork() {
-    std::optional<Time> until = deadline_;
-    const auto noLaterThan = [&until](Time time) { until = until ? std::min(*until, time) : time; };
+    Time until = nextLook_;
+    if (deadline_) {
+        until = std::min(until, *deadline_);
+    }
     if (screen_) {
-        noLaterThan(nextDraw_);
+        until = std::min(until, nextDraw_);
     }
     if (nextGapTime_ && gaps_.gaps() != gapsTold_) {
-        noLaterThan(*nextGapTime_);
+        until = std::min(until, *nextGapTime_);
     }
     if (wake_.wait(until, device_->hangUpDescriptor())) {
         unplugged_ = true;
@@ -159,6 +168,15 @@ void LiveRun::handleWork() {
     }
     tellOfGaps();
     writeRecordingOnWish();
+    lookAfterReports();
+}
+
+void LiveRun::lookAfterReports() {
+    const Time now = std::chrono::steady_clock::now();
+    if (now >= nextLook_) {
+        nextLook_ = now + watch_.interval();
+        stuck_ = watch_.look();
+    }
 }
 
 void LiveRun::tellOfGaps() {

@@ -12,6 +12,7 @@
 #include "Tools/LiveScreen.h"
 #include "Tools/LiveSurface.h"
 #include "Tools/ObservedDevice.h"
+#include "Tools/ReportWatch.h"
 #include "Tools/SettingKeys.h"
 #include "Tools/SignalWatch.h"
 #include "Tools/Streams.h"
@@ -47,7 +48,8 @@ struct LiveRunOptions {
 /// A service run by a host from its first step to its last: a plug-in, a device and somebody who
 /// looks at the events. Says when frames of the device were lost, at most once a second, and how
 /// many in the end. It ends when the device has played everything or is gone, after a time,
-/// after a number of events, at a signal, or when nobody takes the events any more.
+/// after a number of events, at a signal, when nobody takes the events any more, or when the
+/// service takes no reports.
 ///
 /// The thread that runs it prints, draws and writes; the input thread and the device's player only
 /// ever leave things for it. Keys are pressed on the thread that delivers the events; none is down
@@ -80,6 +82,7 @@ private:
     void installHooks();
     [[nodiscard]] bool isOver() const;
     void waitForWork();
+    void lookAfterReports();
     void handleWork();
     void takeEvents();
     void print(const DeliveredEvent& event);
@@ -111,6 +114,9 @@ private:
     std::optional<Time> nextGapTime_;  // not before this is there a further line
     std::optional<Time> deadline_;
     Time nextDraw_;
+    ReportWatch watch_;
+    Time nextLook_;
+    bool stuck_ = false;
     bool quit_ = false;
     // Set by the device's threads.
     std::atomic<bool> finished_ = false;

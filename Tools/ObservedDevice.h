@@ -41,6 +41,10 @@ public:
 
     /// When no hook tells of an unplug: poll it for no events, and a hang-up tells. -1: none.
     [[nodiscard]] virtual int hangUpDescriptor() const noexcept { return -1; }
+    /// Reports of the latest opening that left a played device or were read from a live one, and
+    /// those that the service is done with. Any thread.
+    [[nodiscard]] virtual std::uint64_t sent() const noexcept = 0;
+    [[nodiscard]] virtual std::uint64_t handled() const noexcept = 0;
     /// What became of the reports of the latest opening: "12 reports sent, 0 dropped".
     [[nodiscard]] virtual std::string tally() const = 0;
 };

@@ -89,10 +89,10 @@ public:
     void unplug() noexcept;
 
     // Of the latest opening. Any thread.
-    [[nodiscard]] std::uint64_t sent() const noexcept { return sent_.load(); }
+    [[nodiscard]] std::uint64_t sent() const noexcept override { return sent_.load(); }
     /// Reports that found no room, of `sent` none.
     [[nodiscard]] std::uint64_t dropped() const noexcept { return dropped_.load(); }
-    [[nodiscard]] std::uint64_t handled() const noexcept { return handled_.load(); }
+    [[nodiscard]] std::uint64_t handled() const noexcept override { return handled_.load(); }
 
 private:
     class Player;

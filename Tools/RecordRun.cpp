@@ -41,6 +41,7 @@ RecordRun::RecordRun(const Host::PluginLibrary& library,
       feed_(std::make_shared<FrameFeed>([&wake] { wake.notify(); }, options_.feedBytes)),
       decoder_({.onFrame = [this](const RecordedFrame& frame) { take(frame); },
                 .onGap = [this](const FrameGap& gap) { take(gap); }}),
+      watch_(*device, streams.patience),
       noHoldBack_(!options_.holdBack),
       registration_(std::make_shared<TappedDevice>(device, tap_)),
       session_(library, registration_.service(), std::move(sink)) {
@@ -82,8 +83,10 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     if (options_.duration) {
         deadline_ = start_ + *options_.duration;
     }
+    nextLook_ = start_ + watch_.interval();
     for (bool any = takeFrames(); !isOver(); any = takeFrames()) {
         drawProgress(false);
+        lookAfterReports();
         // A feed that was not empty wakes nobody.
         if (!any) {
             waitForWork();
@@ -100,18 +103,24 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     if (unplugged_) {
         throw Failure("the device was unplugged");
     }
+    if (stuck_) {
+        throw Failure(ReportWatch::kFault);
+    }
     return summary_;
 }
 
 bool RecordRun::isOver() const {
-    return finished_ || unplugged_ || signals_.endWanted() ||
+    return finished_ || unplugged_ || stuck_ || signals_.endWanted() ||
            (options_.count && summary_.reports >= *options_.count) ||
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
 
 void RecordRun::waitForWork() {
-    std::optional<Time> until = deadline_;
-    const auto noLaterThan = [&until](Time time) { until = until ? std::min(*until, time) : time; };
+    Time until = nextLook_;
+    const auto noLaterThan = [&until](Time time) { until = std::min(until, time); };
+    if (deadline_) {
+        noLaterThan(*deadline_);
+    }
     if (streams_.errorIsTerminal) {
         noLaterThan(nextDraw_);
     }
@@ -120,6 +129,14 @@ void RecordRun::waitForWork() {
     }
     if (wake_.wait(until, device_->hangUpDescriptor())) {
         unplugged_ = true;
+    }
+}
+
+void RecordRun::lookAfterReports() {
+    const Time now = std::chrono::steady_clock::now();
+    if (now >= nextLook_) {
+        nextLook_ = now + watch_.interval();
+        stuck_ = watch_.look();
     }
 }
 

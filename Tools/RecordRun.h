@@ -7,6 +7,7 @@
 #include "Tools/InputTap.h"
 #include "Tools/ObservedDevice.h"
 #include "Tools/RecordingStream.h"
+#include "Tools/ReportWatch.h"
 #include "Tools/SettingKeys.h"
 #include "Tools/SignalWatch.h"
 #include "Tools/Streams.h"
@@ -43,7 +44,8 @@ struct RecordSummary {
 
 /// A service with a device of its own whose every input goes into a file, for as long as that
 /// takes. It ends when the device has played everything or is gone, after a time, after a number
-/// of reports, at a signal, or when the file cannot be written any more.
+/// of reports, at a signal, when the file cannot be written any more, or when the service takes no
+/// reports.
 ///
 /// The thread that runs it writes; the input thread and the device's player never wait for it.
 class RecordRun {
@@ -71,6 +73,7 @@ private:
     void installHooks();
     [[nodiscard]] bool isOver() const;
     void waitForWork();
+    void lookAfterReports();
     bool takeFrames();
     void holdBack() noexcept;
     void endHoldBack() noexcept;
@@ -92,6 +95,9 @@ private:
     std::optional<Time> deadline_;
     Time start_;
     Time nextDraw_;
+    ReportWatch watch_;
+    Time nextLook_;
+    bool stuck_ = false;
     // The device's player waits for the second to change while the first is false.
     std::atomic<bool> noHoldBack_;
     std::atomic<std::uint32_t> turns_ = 0;

@@ -66,12 +66,12 @@ constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
      "ended in order: everything was played, the time or number was reached, or a signal asked for "
      "it"},
     {kExitFailure,
-     "the plug-in or the device cannot be used, the device was unplugged, or results could not be "
-     "written"},
+     "the plug-in or the device cannot be used, the service takes no reports for five seconds, the "
+     "device was unplugged, or results could not be written"},
     {kExitUsage, "the command line is wrong, an unknown setting included"},
 }};
 
-constexpr std::array<ExampleEntry, 6> kExamples = {{
+constexpr std::array<ExampleEntry, 7> kExamples = {{
     {"vexatouch run --show", "Plays random gestures and draws the surface until q or Ctrl-C"},
     {"vexatouch run --device sim:Examples/taps.gesture",
      "Plays a script of gestures in real time and prints what the service makes of it"},

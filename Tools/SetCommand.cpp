@@ -85,7 +85,8 @@ int runSet(const Arguments& arguments, Streams& streams) {
     DeviceWishes wishes{.announceSeed = false};
     wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
     wishes.match = matchOption(arguments, choice);
-    HostedDevice hosted(makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {});
+    HostedDevice hosted(
+        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
     hosted.begin();
     if (!hosted.session().setProperty(key, value)) {
         throw Failure(key + ": the device did not take the value");

@@ -2,6 +2,7 @@
 
 #include "Platform/HostClock.h"
 
+#include <chrono>
 #include <istream>
 #include <ostream>
 
@@ -17,6 +18,8 @@ struct Streams {
     unsigned columns = 80;                               ///< width of the terminal
     unsigned rows = 24;                                  ///< height of the terminal
     Vexa::HostClock& clock = Vexa::HostClock::system();  ///< what playing in real time waits by
+    /// How long a service may leave the reports of its device alone.
+    std::chrono::nanoseconds patience = std::chrono::seconds(5);
 };
 
 }  // namespace VexaTouch::Tools

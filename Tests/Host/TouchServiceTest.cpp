@@ -2,6 +2,7 @@
 
 #include "Host/HostFailure.h"
 #include "Host/HostSession.h"
+#include "Host/PluginInstance.h"
 #include "Host/PluginLibrary.h"
 #include "Platform/ScriptedDevice.h"
 
@@ -81,6 +82,12 @@ TEST_F(TouchServiceTest, PropertiesAreAnsweredFromStartToStop) {
 }
 
 TEST_F(TouchServiceTest, ProbeLeavesTheScoreAlone) {
+    const Host::PluginInstance plugin(library);
+    for (const std::int32_t rated : {0, 1, -3, 4711, INT32_MAX, INT32_MIN}) {
+        std::int32_t score = rated;
+        EXPECT_EQ(plugin.probe({}, registration.service(), score), VEXA_STATUS_SUCCESS);
+        EXPECT_EQ(score, rated);
+    }
     EXPECT_EQ(HostSession(library, registration.service(), sink()).score(), 0);
 }
 

@@ -46,25 +46,30 @@
     DEFECT(AbortsOnOddReport, "random-reports", "")                                               \
     DEFECT(DeliversOnInputThread, "events", "random-reports")                                     \
     DEFECT(DeliversOptions, "events", "random-reports")                                           \
-    DEFECT(LeaksEvent, "events", "destroy cycles leaks memory unload")                            \
+    DEFECT(LeaksEvent, "events",                                                                  \
+           "device-failures unplug destroy cycles leaks memory unload")                           \
     DEFECT(WrongRefcon, "events", "random-reports late-callback")                                 \
     DEFECT(WrongSender, "events", "random-reports")                                               \
     DEFECT(TakesLateCallback, "late-callback", "")                                                \
     DEFECT(UnschedulesLate, "unschedule", "unload")                                               \
     DEFECT(IgnoresOpenFailure, "device-failures", "unplug")                                       \
+    DEFECT(LosesDescriptorOnFailedOpen, "device-failures", "")                                    \
     DEFECT(IgnoresRefusedProperty, "device-failures", "")                                         \
     DEFECT(AbortsWhenUnplugged, "unplug", "")                                                     \
+    DEFECT(LosesDescriptorWhenUnplugged, "unplug", "")                                            \
     DEFECT(AbortsDestroyedAfterStart, "destroy", "reference-counts reference-threads")            \
     DEFECT(KeepsDeviceWhenDestroyed, "destroy", "reference-counts reference-threads")             \
     DEFECT(AbortsDestroyedWhileScheduled, "destroy-scheduled", "")                                \
     DEFECT(ExitsAfterManyStarts, "cycles", "")                                                    \
     DEFECT(GivesUpAfterManyStarts, "cycles", "")                                                  \
-    DEFECT(LeaksDescriptor, "leaks", "property-values destroy cycles unload")                     \
+    DEFECT(LeaksDescriptor, "leaks",                                                              \
+           "property-values device-failures unplug destroy cycles unload")                        \
     DEFECT(LeaksDevice, "leaks",                                                                  \
-           "reference-counts reference-threads property-values repeated-calls destroy "           \
-           "cycles memory unload")                                                                \
-    DEFECT(LeaksValue, "leaks", "property-values destroy cycles memory unload")                   \
-    DEFECT(LeavesThreadBehind, "leaks", "memory unload")                                          \
+           "reference-counts reference-threads property-values repeated-calls device-failures "   \
+           "unplug destroy cycles memory unload")                                                 \
+    DEFECT(LeaksValue, "leaks",                                                                   \
+           "property-values device-failures unplug destroy cycles memory unload")                 \
+    DEFECT(LeavesThreadBehind, "leaks", "unplug memory unload")                                   \
     DEFECT(LeaksMemory, "memory", "")                                                             \
     DEFECT(LingersAfterUnloading, "unload", "")
 /* clang-format on */

@@ -224,6 +224,9 @@ static bool open_device(void* self, uint32_t options) {
     if (has(AbortsOnSecondOpen) && service->opened) abort();
     service->opened = true;
     const vexa_status status = vexa_device_open(service->device, options);
+    if (has(LosesDescriptorOnFailedOpen) && status == VEXA_STATUS_IO_ERROR) {
+        (void)!dup(STDERR_FILENO);
+    }
     return has(IgnoresOpenFailure) || status == VEXA_STATUS_SUCCESS;
 }
 
@@ -231,6 +234,9 @@ static void close_device(void* self, uint32_t options) {
     sample_service* service = owner(self);
     if (service->device == NULL) return;
     if (has(AbortsWhenUnplugged) && !vexa_device_is_present(service->device)) abort();
+    if (has(LosesDescriptorWhenUnplugged) && !vexa_device_is_present(service->device)) {
+        (void)!dup(STDERR_FILENO);
+    }
     service->opened = false;
     vexa_device_close(service->device, options);
 }

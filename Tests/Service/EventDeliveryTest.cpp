@@ -15,11 +15,13 @@
 
 #include <vexa/event.h>
 #include <vexa/queue.h>
+#include <vexa/trace.h>
 #include <atomic>
 #include <cstdint>
 #include <mutex>
 #include <ostream>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -133,6 +135,87 @@ TEST_F(EventDeliveryTest, EachStageIsLoggedAndTraced) {
                             TracePoint{0x2B150188, {11, 128}}, TracePoint{0x2B150180, {2, 0, 0, 0}},
                             TracePoint{0x2B15018C, {0, 0}}, TracePoint{0x2B150184, {2}},
                             TracePoint{0x2B150188, {11, 8}}, TracePoint{0x2B150188, {1, 0}}));
+}
+
+/// What happens in a delivery, in one order: trace points, messages and callbacks.
+class DeliveryJournal {
+public:
+    DeliveryJournal() {
+        Vexa::Log::setSink(
+            [this](Vexa::LogCategory, Vexa::LogLevel, std::string_view text) { logged(text); });
+        Vexa::Log::setLevel(Vexa::LogCategory::HIDService, Vexa::LogLevel::Debug);
+    }
+    ~DeliveryJournal() {
+        Vexa::Log::setLevel(Vexa::LogCategory::HIDService, before_);
+        Vexa::Log::setSink({});
+    }
+    DeliveryJournal(const DeliveryJournal&) = delete;
+    DeliveryJournal(DeliveryJournal&&) = delete;
+    DeliveryJournal& operator=(const DeliveryJournal&) = delete;
+    DeliveryJournal& operator=(DeliveryJournal&&) = delete;
+
+    static void callback(void* target, void*, void*, vexa_event* event, std::uint32_t) noexcept {
+        static_cast<DeliveryJournal*>(target)->note("callback " +
+                                                    Vexa::HidEvent::share(event).description());
+    }
+    [[nodiscard]] std::vector<std::string> take() {
+        const std::lock_guard lock(mutex_);
+        return std::exchange(lines_, {});
+    }
+
+private:
+    void logged(std::string_view text) {
+        if (text.starts_with("Dispatch ") && !text.ends_with("takeoff")) {
+            note("log " + std::string(text));
+        }
+    }
+    void traced(std::uint32_t code, Vexa::TraceListener::Arguments arguments) {
+        if (code == VEXA_TRACE_BATCH) {
+            note("trace batch of " + std::to_string(arguments[0]));
+        } else if (code == VEXA_TRACE_EVENT) {
+            note("trace event of type " + std::to_string(arguments[0]));
+        }
+    }
+    void note(std::string line) {
+        const std::lock_guard lock(mutex_);
+        lines_.push_back(std::move(line));
+    }
+
+    Vexa::LogLevel before_ = Vexa::Log::level(Vexa::LogCategory::HIDService);
+    std::mutex mutex_;
+    std::vector<std::string> lines_;
+    Vexa::TraceListener listener_{
+        [this](std::uint32_t code, Vexa::TraceListener::Arguments arguments) {
+            traced(code, arguments);
+        }};
+};
+
+TEST_F(EventDeliveryTest, EachEventIsTracedThenLoggedThenHandedOver) {
+    DeliveryJournal journal;
+    ASSERT_EQ(stand.service.start(stand.registration.service()), 0U);
+    stand.service.setEventCallback(&DeliveryJournal::callback, &journal, nullptr);
+    stand.service.schedule(stand.queue);
+    ASSERT_TRUE(stand.service.open());
+    // The reset during a touch makes a batch of two.
+    ASSERT_TRUE(
+        stand.feed({imageReport(touch("H").at(350).with("I", 150), 1, 10), firmwareReport(0)}));
+    stand.service.unschedule(stand.queue);
+    const std::vector<std::string> lines = journal.take();
+    const auto described = [&lines](std::size_t callback) {
+        std::vector<std::string> callbacks;
+        for (const std::string& line : lines) {
+            if (line.starts_with("callback ")) callbacks.push_back(line.substr(9));
+        }
+        return callback < callbacks.size() ? callbacks[callback] : "no callback";
+    };
+    EXPECT_THAT(
+        lines,
+        ElementsAre("trace batch of 1", "log Dispatch 1 event(s) land", "trace event of type 11",
+                    "log Dispatch event: " + described(0), "callback " + described(0),
+                    "trace batch of 2", "log Dispatch 2 event(s) land", "trace event of type 11",
+                    "log Dispatch event: " + described(1), "callback " + described(1),
+                    "trace event of type 1", "log Dispatch event: " + described(2),
+                    "callback " + described(2)));
 }
 
 /// What a callback got, and on which of two queues.

@@ -2,6 +2,7 @@
 
 #include "Platform/HostClock.h"
 #include "Tests/Support/EventMatchers.h"
+#include "Tests/Support/LeakCheck.h"
 #include "Tests/Support/LogCapture.h"
 #include "Tests/Support/PrintPropertyValue.h"
 #include "Tests/Support/ServiceUnderTest.h"
@@ -124,6 +125,19 @@ TEST_F(InputReportTest, EachArrivalIsLoggedWithItsTime) {
     EXPECT_EQ(arrivals, 2U);
 }
 
+TEST_F(InputReportTest, AnArrivalIsLoggedBeforeItsProbes) {
+    LogCapture log;
+    ASSERT_TRUE(stand.feed({{9}, firmwareReport(1)}));
+    std::vector<LogLine> lines = log.take();
+    for (LogLine& line : lines) line.text = line.text.substr(0, line.text.find(", timestampMach"));
+    EXPECT_THAT(lines,
+                ElementsAre(debug("Received input report (type 0, reportID 9, reportLength 1"),
+                            debug("Input report probe"), debug("Invalid input report with ID 9"),
+                            debug("Received input report (type 0, reportID 2, reportLength 10"),
+                            debug("Input report probe"),
+                            info("Firmware event probe; event: 1, context: 0")));
+}
+
 TEST_F(InputReportTest, InvalidReportsAreLogged) {
     LogCapture log;
     ASSERT_TRUE(stand.feed({{}, {7}, {1, 2}, {2, 0}}));
@@ -188,12 +202,45 @@ TEST_F(InputReportTest, ReportsThatWaitedAreHandledInTheirOrder) {
     EXPECT_EQ(disjointImages(), 0U);
 }
 
-TEST_F(InputReportTest, ALostDeviceOnlyFallsSilent) {
-    ASSERT_TRUE(stand.feed(images({1, 2})));
+/// Loses the device of a service in the middle of its life.
+void loseDevice() {
+    ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+    const ServiceUnderTest& service = stand.service;
+    stand.device->setPropertyValue("Product", "surface");
+    stand.device->setWrites(Vexa::ScriptedDevice::Writes::Accepted);
+    stand.device->setFeatureReport(4, {4, 1, 2});
+    stand.startUp();
+    ASSERT_TRUE(stand.feed({imageReport(nothing(), 1, 10), imageReport(nothing(), 3, 30)}));
+    ASSERT_TRUE(stand.feed({firmwareReport(0)}));
+    ASSERT_EQ(service.get("Product"), PropertyValue("surface"));
+    ASSERT_TRUE(service.set("Product", 1));
+    ASSERT_EQ(service.get("FirmwareVersion"), PropertyValue(PropertyValue::Array{1, 2}));
+    ASSERT_EQ(service.get("DisjointImageCount"), PropertyValue(1U));
+    const PropertyValue recording = service.get("Recording");
+    const std::uint32_t references = service.references();
+
     stand.device->unplug();
-    EXPECT_EQ(disjointImages(), 0U);
-    EXPECT_EQ(stand.service.get("Product"), PropertyValue());
-    EXPECT_FALSE(stand.service.set("Product", 1));
+    EXPECT_EQ(service.get("Product"), PropertyValue());
+    EXPECT_FALSE(service.set("Product", 1));
+    EXPECT_EQ(service.get("FirmwareVersion"), PropertyValue());
+    EXPECT_FALSE(service.open());
+    // What does not come from the device is there as before, the input thread included.
+    EXPECT_EQ(service.get("DisjointImageCount"), PropertyValue(1U));
+    EXPECT_EQ(service.get("Recording"), recording);
+    EXPECT_EQ(service.references(), references);
+    EXPECT_EQ(stand.device->handled(), 3U);
+    stand.queue.drain();
+    EXPECT_THAT(stand.events.take(), ElementsAre(FirmwareReset()));
+    service.unschedule(stand.queue);
+    EXPECT_EQ(service.references(), 2U);
+    EXPECT_EQ(service.stop(), 0U);
+}
+
+TEST(LostDeviceTest, ALostDeviceOnlyFallsSilentAndLeavesNothing) {
+    const LoadedPlugin plugin(VEXATOUCH_PLUGIN_FILE);
+    const LeakCheck leaks;
+    loseDevice();
+    leaks.expectNothingLeft();
 }
 
 }  // namespace

@@ -9,9 +9,11 @@
 #include "Tests/Support/Touch.h"
 
 #include <gmock/gmock.h>
+#include <gtest/gtest-spi.h>
 #include <gtest/gtest.h>
 
 #include <fcntl.h>
+#include <unistd.h>
 #include <array>
 #include <cstddef>
 #include <cstdint>
@@ -29,6 +31,7 @@
 namespace VexaTouch::Testing {
 namespace {
 
+using testing::Contains;
 using testing::ElementsAre;
 using Vexa::PropertyValue;
 using Vexa::ScriptedDevice;
@@ -88,10 +91,23 @@ TEST_F(ServiceLifecycleTest, EachOperationLogsItsName) {
 }
 
 TEST_F(ServiceLifecycleTest, NothingIsLoggedAboveDebugInAnOrdinaryLife) {
-    stand.startUp();
     LogCapture log;
+    stand.startUp();
+    const std::size_t threads = threadCount();
+    ASSERT_TRUE(stand.feed({imageReport(nothing(), 1, 10)}));
+    EXPECT_EQ(stand.service.get("Version"), PropertyValue(PropertyValue::Array{13, 0, 0}));
     stand.tearDown();
-    for (const LogLine& line : log.take()) EXPECT_EQ(line.level, Vexa::LogLevel::Debug) << line;
+    ASSERT_TRUE(waitForThreads(threads - 1));
+    const std::vector<LogLine> lines = log.take();
+    for (const LogLine& line : lines) EXPECT_EQ(line.level, Vexa::LogLevel::Debug) << line;
+    // All of the life was seen.
+    EXPECT_EQ(lines.front(), debug("probeWithService:properties:outScore:"));
+    for (const char* text :
+         {"scheduleWithDispatchQueue:", "input report thread start", "openWithOptions:0",
+          "Input report probe", "getPropertyForKey:Version", "closeWithOptions:0",
+          "unscheduleWithDispatchQueue:", "input report thread end", "stop"}) {
+        EXPECT_THAT(lines, Contains(debug(text)));
+    }
 }
 
 TEST_F(ServiceLifecycleTest, StartFailsForAnUnknownHandle) {
@@ -154,12 +170,17 @@ TEST_F(ServiceLifecycleTest, UnschedulingLeavesProbesAndDeviceBehind) {
     EXPECT_EQ(stand.service.get("DisjointImageCount"), PropertyValue(0U));
 }
 
-TEST_F(ServiceLifecycleTest, UnschedulingWithoutAThreadOnlyLetsTheQueueGo) {
-    const LiveObjects before = LiveObjects::now();
+TEST_F(ServiceLifecycleTest, UnschedulingWhatWasNeverScheduledDoesNothing) {
+    const LeakCheck leaks;
     stand.service.unschedule({});
     stand.service.unschedule(stand.queue);
     stand.service.unschedule(stand.queue);
-    EXPECT_EQ(LiveObjects::now(), before);
+    leaks.expectNothingLeft();
+    EXPECT_EQ(stand.service.references(), 2U);
+    stand.startUp();
+    EXPECT_TRUE(stand.feed({firmwareReport(0)}));
+    EXPECT_EQ(stand.events.take().size(), 1U);
+    stand.tearDown();
 }
 
 TEST_F(ServiceLifecycleTest, TheQueueIsHeldWhileScheduled) {
@@ -544,11 +565,12 @@ INSTANTIATE_TEST_SUITE_P(Of, UnplugInTheMiddleTest,
                                          ScriptedDevice::kReportHandled),
                          [](const auto& operation) { return std::string(operation.param); });
 
-TEST_P(UnplugInTheMiddleTest, TheLifeEndsInOrder) {
+/// Lives until the device has gone in `operation`.
+void liveWithUnplugIn(std::string_view operation) {
     ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
     stand.device->setFeatureReport(4, {4, 1, 2});
-    stand.device->setHook([&](std::string_view operation) {
-        if (operation == GetParam()) stand.device->unplug();
+    stand.device->setHook([&](std::string_view running) {
+        if (running == operation) stand.device->unplug();
     });
     const ServiceUnderTest& service = stand.service;
     ASSERT_EQ(service.start(stand.registration.service()), 0U);
@@ -566,6 +588,25 @@ TEST_P(UnplugInTheMiddleTest, TheLifeEndsInOrder) {
     stand.queue.drain();
     EXPECT_EQ(service.references(), 2U);
     stand.device->setHook({});
+}
+
+TEST_P(UnplugInTheMiddleTest, TheLifeEndsInOrderAndLeavesNothing) {
+    const LoadedPlugin plugin(VEXATOUCH_PLUGIN_FILE);
+    const LeakCheck leaks;
+    liveWithUnplugIn(GetParam());
+    leaks.expectNothingLeft();
+}
+
+/// A life that ends with one descriptor more than it began with.
+void loseADescriptor() {
+    const LeakCheck leaks;
+    const int lost = ::open("/dev/null", O_RDONLY | O_CLOEXEC);
+    leaks.expectNothingLeft();
+    ::close(lost);
+}
+
+TEST(LeakCheckTest, ALostDescriptorIsFound) {
+    EXPECT_NONFATAL_FAILURE(loseADescriptor(), "descriptors");
 }
 
 }  // namespace

@@ -9,6 +9,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <thread>
 #include <vector>
@@ -64,10 +65,12 @@ public:
     void scheduleWithDispatchQueue(const Vexa::SerialQueue& queue) override {
         calls.emplace_back("schedule");
         seenQueue = queue.get();
+        if (onQueue) onQueue(queue);
     }
     void unscheduleWithDispatchQueue(const Vexa::SerialQueue& queue) override {
         calls.emplace_back("unschedule");
         seenQueue = queue.get();
+        if (onQueue) onQueue(queue);
     }
     std::optional<Vexa::HidEvent> copyEventWithType(std::uint32_t type,
                                                     const Vexa::HidEvent& matching,
@@ -85,6 +88,7 @@ public:
     void* seenTarget = nullptr;
     void* seenRefcon = nullptr;
     vexa_queue* seenQueue = nullptr;
+    std::function<void(const Vexa::SerialQueue& queue)> onQueue;
     vexa_event* seenEvent = nullptr;
 
 protected:
@@ -220,6 +224,27 @@ TEST(VexaHIDServiceTest, TrampolinesPassPointersOn) {
     EXPECT_EQ(copy, event);
     EXPECT_THAT(service.calls,
                 testing::ElementsAre("callback", "schedule", "unschedule", "output", "event 11 3"));
+}
+
+TEST(VexaHIDServiceTest, SchedulingSlotsHoldTheQueueForTheCall) {
+    const auto made = makeService<RecordingService>();
+    const ServiceUnderTest host(referenceFor(made));
+    const std::int64_t before = vexa_live_objects(VEXA_OBJECT_QUEUE);
+    Vexa::SerialQueue own;
+    int ran = 0;
+    made.get()->onQueue = [&](const Vexa::SerialQueue& queue) {
+        own.reset();
+        EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_QUEUE), before + 1);
+        queue.submit([&ran]() noexcept { ++ran; });
+        queue.drain();
+    };
+    own = Vexa::SerialQueue("the host's");
+    host.schedule(own);
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_QUEUE), before);
+    own = Vexa::SerialQueue("the host's");
+    host.unschedule(own);
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_QUEUE), before);
+    EXPECT_EQ(ran, 2);
 }
 
 TEST(VexaHIDServiceTest, WhatTheHostLendsIsNotKept) {

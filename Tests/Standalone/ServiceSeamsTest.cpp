@@ -1,6 +1,8 @@
 // A process of its own, since it replaces functions that the plug-in calls.
 
 #include "Pipeline/PipelineRecording.h"
+#include "Platform/HostClock.h"
+#include "Shared/Util.h"
 #include "Tests/Support/LiveObjects.h"
 #include "Tests/Support/LogCapture.h"
 #include "Tests/Support/ProcessThreads.h"
@@ -67,6 +69,22 @@ std::atomic<int> signals{0};
 /// Called when the elements of this array are read next, once.
 std::atomic<const vexa_value*> watchedArray{nullptr};
 std::function<void()> onReadOfArray;
+
+/// Called when this value is read as a number next, once.
+std::atomic<const vexa_value*> watchedNumber{nullptr};
+std::function<void()> onReadOfNumber;
+
+/// The time that reports come with, in place of the host's; 0: the host's.
+std::atomic<std::uint64_t> deviceTime{0};
+std::atomic<vexa_input_report_callback> serviceCallback{nullptr};
+
+void passReportOn(void* context, vexa_status result, vexa_device* sender, vexa_report_type type,
+                  std::uint32_t reportId, const std::uint8_t* report, std::size_t length,
+                  std::uint64_t timestamp) {
+    const std::uint64_t other = deviceTime;
+    serviceCallback.load()(context, result, sender, type, reportId, report, length,
+                           other != 0 ? other : timestamp);
+}
 
 /// A call that gives the device a place to send reports to, or takes it away.
 struct DeviceCall {
@@ -158,6 +176,13 @@ VEXA_API const vexa_value* const* vexa_value_get_elements(const vexa_value* arra
     return elements(array, count);
 }
 
+VEXA_API float vexa_value_to_float(const vexa_value* value) noexcept {
+    static const auto number = original<float(const vexa_value*)>("vexa_value_to_float");
+    const vexa_value* watched = value;
+    if (value && watchedNumber.compare_exchange_strong(watched, nullptr)) onReadOfNumber();
+    return number(value);
+}
+
 VEXA_API vexa_status vexa_device_schedule(vexa_device* device, vexa_run_loop* loop,
                                           const char* mode) noexcept {
     static const auto schedule =
@@ -186,7 +211,8 @@ VEXA_API vexa_status vexa_device_set_input_report_callback(vexa_device* device, 
                      .buffer = buffer,
                      .length = length,
                      .hasCallback = callback != nullptr});
-    return set(device, buffer, length, callback, context);
+    if (callback) serviceCallback = callback;
+    return set(device, buffer, length, callback ? passReportOn : nullptr, context);
 }
 
 #if VEXA_COUNTS_SIGNALS
@@ -305,12 +331,15 @@ TEST(ServiceSeamsTest, AThreadWithoutARunLoopLeavesTheServiceUnscheduled) {
     // The log's own thread starts with the first thread that it must not hold up, and stays.
     const Vexa::LogWithoutBlocking startsTheLogsThread;
     const std::size_t threads = threadCount();
+    const std::int64_t queues = vexa_live_objects(VEXA_OBJECT_QUEUE);
     haveRunLoops = false;
-    stand.service.schedule(stand.queue);
+    stand.service.schedule(Vexa::SerialQueue("the service's alone"));
     haveRunLoops = true;
     EXPECT_THAT(log.take(), ElementsAre(error("input report thread has no run loop")));
     EXPECT_EQ(stand.service.references(), 2U);
-    stand.service.unschedule(stand.queue);
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_QUEUE), queues + 1);
+    stand.service.unschedule({});
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_QUEUE), queues);
     ASSERT_TRUE(waitForThreads(threads));
     stand.startUp();
     EXPECT_TRUE(stand.feed({firmwareReport(0)}));
@@ -411,15 +440,20 @@ TEST(ServiceSeamsTest, AThreadThatDoesNotStartLeavesTheServiceUnscheduled) {
     ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
     EveryLine log;
     const std::size_t threads = threadCount();
+    const std::int64_t queues = vexa_live_objects(VEXA_OBJECT_QUEUE);
+    Vexa::SerialQueue own("the service's alone");
     {
         const NoThreads none;
-        stand.service.schedule(stand.queue);
+        stand.service.schedule(own);
     }
+    own.reset();
     static_assert(EAGAIN == 11);
     EXPECT_THAT(log.take(), ElementsAre(error("input report thread not started: 11")));
     EXPECT_EQ(stand.service.references(), 2U);
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_QUEUE), queues + 1);
+    stand.service.unschedule({});
+    EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_QUEUE), queues);
     EXPECT_LE(threadCount(), threads);
-    stand.service.unschedule(stand.queue);
     stand.startUp();
     EXPECT_TRUE(stand.feed({firmwareReport(0)}));
     EXPECT_EQ(stand.events.take().size(), 1U);
@@ -550,6 +584,60 @@ TEST(ServiceSeamsTest, ARecordingIsWrittenOutsideTheLock) {
     EXPECT_THAT(recordedKeys(stand.service.get("Recording")),
                 ElementsAre("Unknown", "Algs.ActivationThreshold"));
     EXPECT_EQ(stand.service.get("Pipeline.Algs.ActivationThreshold").toDouble(), 321.0);
+}
+
+TEST(ServiceSeamsTest, AnArrivalIsLoggedBeforeTheLockIsTaken) {
+    ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+    stand.startUp();
+    LogCapture log;
+    const Vexa::PropertyValue threshold(321.0F);
+    std::vector<LogLine> whileLocked;
+    // A setting is read under the lock, while a report comes.
+    onReadOfNumber = [&] {
+        ASSERT_TRUE(stand.device->sendReport(std::vector<std::uint8_t>{9}));
+        const auto deadline = std::chrono::steady_clock::now() + std::chrono::minutes(1);
+        while (whileLocked.empty() && std::chrono::steady_clock::now() < deadline) {
+            whileLocked = log.take();
+            std::erase_if(whileLocked,
+                          [](const LogLine& line) { return !line.text.starts_with("Received"); });
+        }
+        EXPECT_EQ(stand.device->handled(), 0U);
+    };
+    watchedNumber = threshold.handle();
+    ASSERT_TRUE(stand.service.set("Pipeline.Algs.ActivationThreshold", threshold));
+    ASSERT_EQ(watchedNumber, nullptr) << "the setting was not read";
+    onReadOfNumber = nullptr;
+    ASSERT_EQ(whileLocked.size(), 1U);
+    EXPECT_TRUE(whileLocked.front().text.starts_with(
+        "Received input report (type 0, reportID 9, reportLength 1, timestampMach "));
+    ASSERT_TRUE(stand.device->waitUntilHandled(1));
+    EXPECT_THAT(log.take(),
+                ElementsAre(debug("Input report probe"), debug("Invalid input report with ID 9")));
+    stand.tearDown();
+}
+
+TEST(ServiceSeamsTest, TheDevicesTimeIsOnlyLogged) {
+    ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+    stand.startUp();
+    LogCapture log;
+    deviceTime = 4711;
+    const std::uint64_t before = Vexa::HostClock::system().now();
+    ASSERT_TRUE(stand.feed({firmwareReport(0)}));
+    const std::uint64_t after = Vexa::HostClock::system().now();
+    deviceTime = 0;
+    EXPECT_EQ(log.take().front(),
+              debug("Received input report (type 0, reportID 2, reportLength 10, timestampMach "
+                    "4711)"));
+    const std::vector<Vexa::HidEvent> events = stand.events.take();
+    ASSERT_EQ(events.size(), 1U);
+    EXPECT_GE(events[0].timestamp(), before);
+    EXPECT_LE(events[0].timestamp(), after);
+    const Vexa::PropertyValue text = stand.service.get("Recording");
+    const PipelineRecording recording{std::string_view(text.asString().value())};
+    ASSERT_EQ(recording.frames().size(), 1U);
+    EXPECT_EQ(recording.frames().begin()->timestamp,
+              Util::nanosecondsFromMachTime(events[0].timestamp()));
+    stand.tearDown();
 }
 
 /// Unschedules a service whose run loop takes no more tasks.

@@ -8,6 +8,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -38,14 +39,16 @@ struct CommandResult {
 };
 
 /// Runs vexatouch with these arguments; `input` is what it finds on standard input, `clock` what it
-/// waits by.
+/// waits by, `patience` how long a service may leave reports alone.
 inline CommandResult runCommand(const std::vector<std::string>& arguments,
                                 const std::string& input = {},
-                                Vexa::HostClock& clock = Vexa::HostClock::system()) {
+                                Vexa::HostClock& clock = Vexa::HostClock::system(),
+                                std::chrono::nanoseconds patience = std::chrono::minutes(1)) {
     std::istringstream in(input);
     std::ostringstream out;
     std::ostringstream error;
-    Tools::Streams streams{.in = in, .out = out, .error = error, .clock = clock};
+    Tools::Streams streams{
+        .in = in, .out = out, .error = error, .clock = clock, .patience = patience};
     CommandResult result;
     result.exitCode = Tools::CommandLine::run(arguments, streams);
     result.out = out.str();

@@ -99,7 +99,7 @@ TEST(DeviceChoiceTest, WhatIsNoDeviceIsRefused) {
 
 class MakeDeviceTest : public ::testing::Test {
 protected:
-    std::shared_ptr<PlayedDevice> make(const std::string& text, const DeviceWishes& wishes = {}) {
+    std::shared_ptr<ObservedDevice> make(const std::string& text, const DeviceWishes& wishes = {}) {
         return makeDevice(DeviceChoice::parse(text), wishes, streams);
     }
     std::string fault(const std::string& text) {

@@ -6,6 +6,8 @@
 #include "Platform/HidDevice.h"
 #include "Platform/Mutex.h"
 #include "Platform/RunLoop.h"
+#include "Tests/Support/OpenDescriptors.h"
+#include "Tests/Support/ProcessThreads.h"
 #include "Tools/PlayedDevice.h"
 
 #include <gtest/gtest.h>
@@ -13,9 +15,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
-#include <filesystem>
 #include <functional>
-#include <iterator>
 #include <memory>
 #include <string>
 #include <utility>
@@ -41,17 +41,6 @@ inline std::vector<std::vector<std::uint8_t>> reportsOf(const FrameList& frames)
         }
     }
     return reports;
-}
-
-inline std::ptrdiff_t entriesOf(const char* folder) {
-    const std::filesystem::directory_iterator entries(folder);
-    return std::distance(begin(entries), end(entries));
-}
-inline std::ptrdiff_t threadCount() {
-    return entriesOf("/proc/self/task");
-}
-inline std::ptrdiff_t descriptorCount() {
-    return entriesOf("/proc/self/fd");
 }
 
 /// Reads a device on the loop of the thread that made the reader, and keeps what comes.

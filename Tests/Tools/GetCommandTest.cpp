@@ -8,6 +8,7 @@
 
 #include <gmock/gmock.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <limits>
 #include <optional>
@@ -53,6 +54,16 @@ TEST_F(GetCommandTest, ASingleValueStandsAlone) {
     EXPECT_EQ(get({"Version"}), (CommandResult{0, "[13,0,0]\n", ""}));
     EXPECT_EQ(get({"FactoryResetHoldDuration"}), (CommandResult{0, "10000\n", ""}));
     EXPECT_EQ(get({"Pipeline.Algs.ActivationThreshold"}), (CommandResult{0, "200.0\n", ""}));
+    EXPECT_EQ(get({"Product"}), (CommandResult{0, "Vexa Touch Surface\n", ""}));
+}
+
+TEST_F(GetCommandTest, ServiceThatTakesNoReportsIsNotWaitedForForever) {
+    setenv("VEXATOUCH_PLUGIN", VEXATOUCH_SAMPLE_PLUGINS "/TakesNoReports.so", 1);
+    EXPECT_EQ(
+        runCommand({"get", "Product", "--device", sessionAtOnce()}, {}, Vexa::HostClock::system(),
+                   std::chrono::milliseconds(10)),
+        (CommandResult{1, "", "vexatouch get: the service takes no reports; its log says why\n"}));
+    // Without something to be played to its end there is nothing to wait for.
     EXPECT_EQ(get({"Product"}), (CommandResult{0, "Vexa Touch Surface\n", ""}));
 }
 

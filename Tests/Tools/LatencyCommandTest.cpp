@@ -6,6 +6,7 @@
 #include <gmock/gmock.h>
 
 #include <array>
+#include <chrono>
 #include <cstdint>
 #include <cstdlib>
 #include <string>
@@ -51,6 +52,14 @@ protected:
 
     TemporaryFolder folder;
 };
+
+TEST_F(LatencyCommandTest, ServiceThatTakesNoReportsIsNotWaitedForForever) {
+    setenv("VEXATOUCH_PLUGIN", VEXATOUCH_SAMPLE_PLUGINS "/TakesNoReports.so", 1);
+    EXPECT_EQ(runCommand({"latency", "--count", "10"}, {}, Vexa::HostClock::system(),
+                         std::chrono::milliseconds(10)),
+              (CommandResult{
+                  1, "", "vexatouch latency: the service takes no reports; its log says why\n"}));
+}
 
 TEST_F(LatencyCommandTest, EachStageOfEachReportIsMeasured) {
     const auto results = measurements(

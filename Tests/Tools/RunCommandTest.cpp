@@ -16,6 +16,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
@@ -42,6 +43,8 @@ using ::testing::StartsWith;
 
 const std::filesystem::path kExamples = VEXA_SOURCE_DIR "/Examples";
 constexpr const char* kVariable = "VEXATOUCH_PLUGIN";
+/// So long a service that never takes a report is waited for.
+constexpr std::chrono::milliseconds kImpatience{10};
 
 /// What happened: each line from its frame number on.
 std::vector<std::string> eventsIn(const std::string& lines) {
@@ -160,6 +163,73 @@ TEST_F(RunCommandTest, RandomSessionsLiveEqualReplayAndTheNewestReportsAreKept) 
     }
 }
 
+/// A random session of gestures, with one pause after which nothing is left of what was before:
+/// settings and the device's clock stay as they are.
+std::string sessionWithPause(std::uint64_t seed) {
+    constexpr std::uint64_t kBeforeMs = 30'000;
+    constexpr std::uint64_t kAfterMs = 8'000;
+    const auto gestures = [](std::uint64_t of, std::uint64_t durationMs) {
+        std::string kept;
+        for (const std::string& line : linesOf(Tools::randomScript(of, durationMs))) {
+            if (!line.starts_with("seed ") && !line.starts_with("set ") &&
+                !line.starts_with("clock ")) {
+                kept += line + '\n';
+            }
+        }
+        return kept;
+    };
+    // A touch that nobody could miss on either side of it.
+    const std::string pause =
+        "idle 500ms\nstrength 500\nfinger 12\nnoise 4\ndrift 0\ntap play 100ms\nidle 2s\ntap play "
+        "100ms\n";
+    return "seed " + std::to_string(seed) + '\n' + gestures(seed, kBeforeMs) + pause +
+           gestures(~seed, kAfterMs);
+}
+
+/// What happened from the first touch on that came when the surface had been left alone for so
+/// long that the algorithm remembers nothing; of the lines that replay prints.
+std::vector<std::string> eventsAfterPause(const std::vector<std::string>& lines) {
+    constexpr std::uint32_t kPauseMs = 1500;
+    for (std::size_t next = 1; next < lines.size(); ++next) {
+        const Tools::EventRecord before = Tools::eventFromJson(lines[next - 1]);
+        const Tools::EventRecord after = Tools::eventFromJson(lines[next]);
+        if (after.kind == Tools::EventKind::MayBegin &&
+            after.deviceMs - before.deviceMs >= kPauseMs && before.deviceMs != 0) {
+            std::string rest;
+            for (std::size_t line = next; line < lines.size(); ++line) {
+                rest += lines[line] + '\n';
+            }
+            return eventsIn(rest);
+        }
+    }
+    return {};
+}
+
+TEST_F(RunCommandTest, NewestReportsOfALongSessionMakeTheSameEventsAfterAPause) {
+    const std::uint64_t first = std::random_device()();
+    for (std::uint64_t seed = first; seed < first + 5; ++seed) {
+        SCOPED_TRACE("seed " + std::to_string(seed));
+        const std::string session = folder.path("session.json");
+        const std::string recorded = folder.path("recorded.json");
+        ASSERT_EQ(runCommand({"synth", folder.file("pause.gesture", sessionWithPause(seed)), "-o",
+                              session})
+                      .exitCode,
+                  0);
+        const CommandResult live =
+            run({"--device", "recording:" + session + "@max", "--json", "--record", recorded});
+        EXPECT_EQ(live.exitCode, 0) << live;
+        ASSERT_LT(reportsIn(recorded).size(), reportsIn(session).size());
+        const CommandResult kept = runCommand({"replay", "--json", recorded});
+        EXPECT_EQ(kept.exitCode, 0) << kept;
+        const std::vector<std::string> expected = eventsAfterPause(linesOf(kept.out));
+        ASSERT_THAT(expected, Not(IsEmpty()));
+        std::vector<std::string> events = eventsIn(live.out);
+        ASSERT_GE(events.size(), expected.size());
+        events.erase(events.begin(), events.end() - static_cast<std::ptrdiff_t>(expected.size()));
+        EXPECT_EQ(events, expected);
+    }
+}
+
 TEST_F(RunCommandTest, EventsComeInAlignedColumns) {
     const CommandResult result = run({"--device", asFastAsTaken("swipe")});
     EXPECT_EQ(result.exitCode, 0);
@@ -270,6 +340,21 @@ TEST_F(RunCommandTest, WrongCommandLinesAreUsageErrors) {
         EXPECT_EQ(result.exitCode, 2) << text;
         EXPECT_EQ(result.out, "") << text;
         EXPECT_THAT(result.error, StartsWith("vexatouch run: " + text));
+    }
+}
+
+TEST_F(RunCommandTest, ServiceThatTakesNoReportsEndsTheRunInOrder) {
+    setenv(kVariable, VEXATOUCH_SAMPLE_PLUGINS "/TakesNoReports.so", 1);
+    for (const std::string& device : {asFastAsTaken("taps"), std::string("sim")}) {
+        const CommandResult result =
+            runCommand({"run", "--device", device}, {}, Vexa::HostClock::system(), kImpatience);
+        EXPECT_EQ(result.exitCode, 1);
+        EXPECT_EQ(result.out, "     host ms  latency us  event           region\n");
+        EXPECT_THAT(result.error,
+                    MatchesRegex("(simulated surface: random gestures, seed [0-9]+\n)?"
+                                 "[0-9]+ reports? sent, [0-9]+ dropped, 0 events\n"
+                                 "vexatouch run: the service takes no reports; its log says "
+                                 "why\n"));
     }
 }
 

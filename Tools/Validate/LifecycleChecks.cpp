@@ -107,6 +107,52 @@ constexpr std::array<State, 3> kScheduledStates = {{
      }},
 }};
 
+/// A life in which the device refuses what it can.
+void sufferFailures(CheckRun& run, CheckStand& stand) {
+    const CheckedService& service = stand.service();
+    ScriptedDevice& device = stand.device();
+    stand.start();
+    for (const vexa_status status :
+         {VEXA_STATUS_NO_RESOURCES, VEXA_STATUS_IO_ERROR, VEXA_STATUS_GONE, 1U, ~0U}) {
+        device.setNextOpenStatuses({status});
+        run.require(!service.tryOpen(),
+                    "open gives true, but the device gives " + statusText(status));
+        service.close();
+    }
+    run.step("writing a property that the device refuses");
+    device.setWrites(ScriptedDevice::Writes::Refused);
+    run.require(!service.setProperty("ValidateKey", 1),
+                "setProperty gives true, but the device refuses");
+    // Whatever a service reads from its device, it survives failures and short answers.
+    constexpr std::uint32_t kIds = 256;
+    constexpr std::array<const char*, 5> kKeys = {"FirmwareVersion", "FactoryResetHoldDuration",
+                                                  "CriticalErrors", "ServicePluginDebug",
+                                                  "ValidateNothing"};
+    const auto readAll = [&] {
+        for (const char* key : kKeys) {
+            static_cast<void>(service.property(key));
+        }
+    };
+    run.step("reading properties while feature reports fail");
+    for (std::uint32_t id = 0; id < kIds; ++id) {
+        device.setFeatureReportStatus(id, VEXA_STATUS_IO_ERROR);
+    }
+    readAll();
+    for (std::size_t length = 0; length <= 40; ++length) {
+        run.step("reading properties while feature reports have " +
+                 countText(static_cast<std::int64_t>(length), "byte"));
+        for (std::uint32_t id = 0; id < kIds; ++id) {
+            device.setFeatureReport(id, ScriptedDevice::Bytes(length, 0xFF));
+        }
+        readAll();
+    }
+    service.stop();
+    device.setWrites(ScriptedDevice::Writes::Stored);
+    stand.begin();
+    stand.resetReport();
+    stand.end();
+}
+
 /// Bytes of memory in use, of all threads; always 0 with a sanitizer, which looks by itself.
 std::size_t memoryInUse() {
     return mallinfo2().uordblks;
@@ -189,49 +235,13 @@ void checkSecondSchedule(CheckRun& run) {
 
 void checkDeviceFailures(CheckRun& run) {
     const LoadedPlugin plugin(run);
-    CheckStand stand(run, plugin);
-    const CheckedService& service = stand.service();
-    ScriptedDevice& device = stand.device();
-    stand.start();
-    for (const vexa_status status :
-         {VEXA_STATUS_NO_RESOURCES, VEXA_STATUS_IO_ERROR, VEXA_STATUS_GONE, 1U, ~0U}) {
-        device.setNextOpenStatuses({status});
-        run.require(!service.tryOpen(),
-                    "open gives true, but the device gives " + statusText(status));
-        service.close();
+    live(run, plugin);
+    const ProcessResources before = ProcessResources::now();
+    {
+        CheckStand stand(run, plugin);
+        sufferFailures(run, stand);
     }
-    run.step("writing a property that the device refuses");
-    device.setWrites(ScriptedDevice::Writes::Refused);
-    run.require(!service.setProperty("ValidateKey", 1),
-                "setProperty gives true, but the device refuses");
-    // Whatever a service reads from its device, it survives failures and short answers.
-    constexpr std::uint32_t kIds = 256;
-    constexpr std::array<const char*, 5> kKeys = {"FirmwareVersion", "FactoryResetHoldDuration",
-                                                  "CriticalErrors", "ServicePluginDebug",
-                                                  "ValidateNothing"};
-    const auto readAll = [&] {
-        for (const char* key : kKeys) {
-            static_cast<void>(service.property(key));
-        }
-    };
-    run.step("reading properties while feature reports fail");
-    for (std::uint32_t id = 0; id < kIds; ++id) {
-        device.setFeatureReportStatus(id, VEXA_STATUS_IO_ERROR);
-    }
-    readAll();
-    for (std::size_t length = 0; length <= 40; ++length) {
-        run.step("reading properties while feature reports have " +
-                 countText(static_cast<std::int64_t>(length), "byte"));
-        for (std::uint32_t id = 0; id < kIds; ++id) {
-            device.setFeatureReport(id, ScriptedDevice::Bytes(length, 0xFF));
-        }
-        readAll();
-    }
-    service.stop();
-    device.setWrites(ScriptedDevice::Writes::Stored);
-    stand.begin();
-    stand.resetReport();
-    stand.end();
+    requireGivenBack(run, before, "a life whose device failed");
 }
 
 void checkUnplug(CheckRun& run) {
@@ -240,6 +250,8 @@ void checkUnplug(CheckRun& run) {
     constexpr std::chrono::milliseconds kToNotice{2};
     const LoadedPlugin plugin(run);
     SeededNumbers numbers = run.random();
+    live(run, plugin);
+    const ProcessResources before = ProcessResources::now();
     for (int round = 0; round < kRounds; ++round) {
         CheckStand stand(run, plugin);
         const CheckedService& service = stand.service();
@@ -263,6 +275,7 @@ void checkUnplug(CheckRun& run) {
         run.require(!service.tryOpen(), "open gives true for an unplugged device");
         service.stop();
     }
+    requireGivenBack(run, before, "lives whose device was unplugged");
 }
 
 void checkDestroy(CheckRun& run) {

@@ -1,5 +1,8 @@
 #include "Tools/Validate/LoadedPlugin.h"
 
+#include "Host/HostFailure.h"
+#include "Host/PluginLibrary.h"
+
 #include <dlfcn.h>
 
 namespace VexaTouch::Tools {
@@ -10,9 +13,19 @@ std::string loaderError() {
     return text == nullptr ? "the loader does not say why" : text;
 }
 
+/// A plug-in is not to blame for what it does with a platform that is not the one it was promised.
+void requirePlatform(CheckRun& run) {
+    try {
+        Host::PluginLibrary::requirePlatform();
+    } catch (const Host::HostFailure& failure) {
+        run.fail(std::string("cannot be checked: ") + failure.what());
+    }
+}
+
 }  // namespace
 
 LoadedPlugin::LoadedPlugin(CheckRun& run) : run_(run) {
+    requirePlatform(run);
     run.step("loading " + run.plugin());
     // Every symbol now: what is missing shows here and not in the middle of a call.
     library_ = dlopen(run.plugin().c_str(), RTLD_NOW | RTLD_LOCAL);

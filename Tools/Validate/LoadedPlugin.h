@@ -10,7 +10,8 @@ namespace VexaTouch::Tools {
 /// The plug-in as the system's loader gives it, mapped until it is unloaded or the process ends.
 class LoadedPlugin {
 public:
-    /// Fails the check when it cannot be loaded or has no factory.
+    /// Fails the check when libvexaplatform does not serve this program, and when the plug-in
+    /// cannot be loaded or has no factory.
     explicit LoadedPlugin(CheckRun& run);
 
     /// Calls the factory.
