@@ -1,26 +1,48 @@
 # What is used from Debian (installed by script/bootstrap):
 #   HeaderOnlyBoost, HeaderOnlyCli, HeaderOnlySpdlog, HeaderOnlyFmt,
 #   HeaderOnlySystemd, HeaderOnlySdt              header-only, so they serve a cross build as well
+#   LibEvent                         of the machine that is built for
 #   VexaGoogleTest                   gtest and gmock with their main
 #   rapidcheck, benchmark::benchmark_main
 find_package(Threads REQUIRED)
 
-# vexa_header_only(<target> <folder> <header>): the header-only library in /usr/include/<folder>. A
-# cross compiler must not see the rest of that folder (the host's C library), so it gets a link to
-# the one library.
-function(vexa_header_only target folder header)
+# vexa_header_only(<target> <folder> [<header>]): the header-only library in /usr/include/<folder>, or
+# the one header /usr/include/<folder>. A cross compiler must not see the rest of /usr/include (the
+# host's C library), so it gets a link to the one library.
+function(vexa_header_only target folder)
     add_library(${target} INTERFACE)
-    if(NOT EXISTS "/usr/include/${folder}/${header}")
-        message(FATAL_ERROR
-                "/usr/include/${folder}/${header} is missing: run script/bootstrap first")
+    set(header "/usr/include/${folder}")
+    if(ARGC GREATER 2)
+        string(APPEND header "/${ARGV2}")
+    endif()
+    if(NOT EXISTS "${header}")
+        message(FATAL_ERROR "${header} is missing: run script/bootstrap first")
     endif()
     if(CMAKE_CROSSCOMPILING)
-        file(MAKE_DIRECTORY "${PROJECT_BINARY_DIR}/header-only/${folder}")
-        file(REMOVE_RECURSE "${PROJECT_BINARY_DIR}/header-only/${folder}")
-        file(CREATE_LINK "/usr/include/${folder}" "${PROJECT_BINARY_DIR}/header-only/${folder}"
-             SYMBOLIC)
+        set(link "${PROJECT_BINARY_DIR}/header-only/${folder}")
+        get_filename_component(parent "${link}" DIRECTORY)
+        file(MAKE_DIRECTORY "${parent}")
+        file(REMOVE_RECURSE "${link}")
+        file(CREATE_LINK "/usr/include/${folder}" "${link}" SYMBOLIC)
         target_include_directories(${target} SYSTEM INTERFACE "${PROJECT_BINARY_DIR}/header-only")
     endif()
+endfunction()
+
+# vexa_machine_library(<target> <file> <folder> [<header>]): a library to link, by the file name under
+# which programs ask for it (its soname), of the machine that is built for, with headers as above. The
+# headers come from the -dev package of the machine that builds; of the machine that is built for the
+# package with the library itself is enough (PACKAGE:arm64 in script/bootstrap), since many -dev
+# packages cannot be installed for two machines.
+function(vexa_machine_library target file)
+    vexa_header_only(${target} ${ARGN})
+    find_library(${target}_FILE NAMES "${file}"
+                 PATHS "/usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}" NO_DEFAULT_PATH
+                 NO_CMAKE_FIND_ROOT_PATH)
+    if(NOT ${target}_FILE)
+        message(FATAL_ERROR "/usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}/${file} is missing: run "
+                            "script/bootstrap first")
+    endif()
+    target_link_libraries(${target} INTERFACE "${${target}_FILE}")
 endfunction()
 
 vexa_header_only(HeaderOnlyBoost boost json.hpp)
@@ -28,6 +50,8 @@ vexa_header_only(HeaderOnlyCli CLI CLI.hpp)
 vexa_header_only(HeaderOnlySpdlog spdlog spdlog.h)
 vexa_header_only(HeaderOnlyFmt fmt format.h)
 vexa_header_only(HeaderOnlySystemd systemd sd-journal.h)
+
+vexa_machine_library(LibEvent libevent_core-2.1.so.7 event2 event.h)
 
 # Trace points are one header that serves every machine; Debian keeps it with the host's own.
 find_file(VEXA_SDT_HEADER sys/sdt.h PATHS /usr/include
