@@ -74,8 +74,6 @@ public:
         bool isClosed;
     };
 
-    Ready() noexcept {}  // NOLINT(*-member-init): see entries_
-
     void add(Entry entry) noexcept { entries_[count_++] = entry; }
     [[nodiscard]] bool isFull() const noexcept { return count_ == entries_.size(); }
     [[nodiscard]] const Entry* begin() const noexcept { return entries_.data(); }
@@ -173,7 +171,8 @@ bool Vexa::Library::Mode::wait(int milliseconds, Ready& found) noexcept {
     int flags = EVLOOP_ONCE;
     if (milliseconds == 0) flags |= EVLOOP_NONBLOCK;
     if (milliseconds > 0) {
-        const timeval time{.tv_sec = milliseconds / 1000, .tv_usec = milliseconds % 1000 * 1000};
+        const timeval time{.tv_sec = milliseconds / 1000,
+                           .tv_usec = suseconds_t{milliseconds % 1000} * 1000};
         if (event_add(timer.get(), &time) != 0) return false;
     }
     ready = &found;

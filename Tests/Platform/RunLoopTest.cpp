@@ -5,6 +5,7 @@
 #include <sys/resource.h>
 #include <unistd.h>
 #include <algorithm>
+#include <array>
 #include <atomic>
 #include <chrono>
 #include <cstdint>
@@ -333,7 +334,7 @@ TEST(RunLoop, FailsToRunInANewModeWithoutDescriptorsLeft) {
         const int next = ::dup(STDOUT_FILENO);
         ASSERT_GE(next, 0);
         ::close(next);
-        for (const rlim_t left : {0, 1, 2}) {
+        for (const rlim_t left : std::to_array<rlim_t>({0, 1, 2})) {
             rlimit few = before;
             few.rlim_cur = static_cast<rlim_t>(next) + left;
             ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &few), 0);
