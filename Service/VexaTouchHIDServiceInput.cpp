@@ -1,5 +1,6 @@
 // The input thread: how reports come in and events go out.
 
+#include "Platform/SignalsBlocked.h"
 #include "Platform/Trace.h"
 #include "Service/EventDelivery.h"
 #include "Service/LogText.h"
@@ -8,7 +9,6 @@
 #include <pthread.h>
 #include <array>
 #include <cerrno>
-#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <functional>
@@ -58,25 +58,6 @@ int raisePriority() noexcept {
     parameters.sched_priority = kThreadPriority;
     return pthread_setschedparam(pthread_self(), SCHED_RR, &parameters);
 }
-
-/// Blocks all signals of the calling thread, and of those it starts meanwhile: signals go to the
-/// threads of the host, which expects them.
-class SignalsBlocked {
-public:
-    SignalsBlocked() noexcept {
-        sigset_t all;
-        sigfillset(&all);
-        static_cast<void>(pthread_sigmask(SIG_SETMASK, &all, &before_));
-    }
-    ~SignalsBlocked() { static_cast<void>(pthread_sigmask(SIG_SETMASK, &before_, nullptr)); }
-    SignalsBlocked(const SignalsBlocked&) = delete;
-    SignalsBlocked(SignalsBlocked&&) = delete;
-    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
-    SignalsBlocked& operator=(SignalsBlocked&&) = delete;
-
-private:
-    sigset_t before_{};
-};
 
 /// Ends the process loudly: whoever waits here would wait forever.
 void demand(bool holds, const char* what) noexcept {
@@ -144,7 +125,7 @@ int VexaTouchHIDService::startInputThread() {
         _inputReportThreadSignal = std::make_shared<CountingSemaphore>();
         InputReportRun run{ServiceReference<VexaTouchHIDService>::share(this), _vexaDevice,
                            _dispatchEventContext, _inputReportThreadSignal, std::nullopt};
-        const SignalsBlocked blocked;
+        const Vexa::SignalsBlocked blocked;
         std::thread([run = std::move(run)]() mutable noexcept {
             run.service.get()->runInputThread(run);
         }).detach();

@@ -1,5 +1,6 @@
 #include "Tools/PlayedDevice.h"
 
+#include "Platform/SignalsBlocked.h"
 #include "Shared/Util.h"
 
 #include <poll.h>
@@ -14,7 +15,6 @@
 #include <cassert>
 #include <cerrno>
 #include <cmath>
-#include <csignal>
 #include <ctime>
 #include <exception>
 #include <system_error>
@@ -41,22 +41,6 @@ std::uint64_t rounded(double nanoseconds) {
     return nanoseconds < kTooLarge ? static_cast<std::uint64_t>(nanoseconds) : UINT64_MAX;
 }
 
-/// While it lives, threads start with all signals blocked: they are for the program's own threads.
-class SignalsBlocked {
-public:
-    SignalsBlocked() {
-        sigset_t all;
-        sigfillset(&all);
-        pthread_sigmask(SIG_SETMASK, &all, &before_);
-    }
-    ~SignalsBlocked() { pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
-    SignalsBlocked(const SignalsBlocked&) = delete;
-    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
-
-private:
-    sigset_t before_{};
-};
-
 }  // namespace
 
 /// One opening: the writing end of the socket pair and the thread.
@@ -67,7 +51,7 @@ public:
 
     /// Throws std::system_error.
     void start() {
-        const SignalsBlocked blocked;
+        const Vexa::SignalsBlocked blocked;
         thread_ = std::thread([this] { run(); });
     }
 

@@ -1,28 +1,48 @@
 # What is used from Debian (installed by script/bootstrap):
 #   HeaderOnlyBoost, HeaderOnlyCli, HeaderOnlySpdlog, HeaderOnlyFmt,
 #   HeaderOnlySystemd, HeaderOnlySdt              header-only, so they serve a cross build as well
-#   Libevdev                         to be linked; a cross build needs the target machine's
-#   VexaUdev                         libudev
+#   LibEvent, LibUdev, LibEvdev      to be linked, of the machine that is built for
 #   VexaGoogleTest                   gtest and gmock with their main
 #   rapidcheck, benchmark::benchmark_main
 find_package(Threads REQUIRED)
 
-# vexa_header_only(<target> <folder> <header>): the header-only library in /usr/include/<folder>. A
-# cross compiler must not see the rest of that folder (the host's C library), so it gets a link to
-# the one library.
-function(vexa_header_only target folder header)
+# vexa_header_only(<target> <folder> [<header>]): the header-only library in /usr/include/<folder>, or
+# the one header /usr/include/<folder>. A cross compiler must not see the rest of /usr/include (the
+# host's C library), so it gets a link to the one library.
+function(vexa_header_only target folder)
     add_library(${target} INTERFACE)
-    if(NOT EXISTS "/usr/include/${folder}/${header}")
-        message(FATAL_ERROR
-                "/usr/include/${folder}/${header} is missing: run script/bootstrap first")
+    set(header "/usr/include/${folder}")
+    if(ARGC GREATER 2)
+        string(APPEND header "/${ARGV2}")
+    endif()
+    if(NOT EXISTS "${header}")
+        message(FATAL_ERROR "${header} is missing: run script/bootstrap first")
     endif()
     if(CMAKE_CROSSCOMPILING)
-        file(MAKE_DIRECTORY "${PROJECT_BINARY_DIR}/header-only/${folder}")
-        file(REMOVE_RECURSE "${PROJECT_BINARY_DIR}/header-only/${folder}")
-        file(CREATE_LINK "/usr/include/${folder}" "${PROJECT_BINARY_DIR}/header-only/${folder}"
-             SYMBOLIC)
+        set(link "${PROJECT_BINARY_DIR}/header-only/${folder}")
+        get_filename_component(parent "${link}" DIRECTORY)
+        file(MAKE_DIRECTORY "${parent}")
+        file(REMOVE_RECURSE "${link}")
+        file(CREATE_LINK "/usr/include/${folder}" "${link}" SYMBOLIC)
         target_include_directories(${target} SYSTEM INTERFACE "${PROJECT_BINARY_DIR}/header-only")
     endif()
+endfunction()
+
+# vexa_machine_library(<target> <file> <folder> [<header>]): a library to link, by the file name under
+# which programs ask for it (its soname), of the machine that is built for, with headers as above. The
+# headers come from the -dev package of the machine that builds; of the machine that is built for the
+# package with the library itself is enough (PACKAGE:arm64 in script/bootstrap), since many -dev
+# packages cannot be installed for two machines.
+function(vexa_machine_library target file)
+    vexa_header_only(${target} ${ARGN})
+    find_library(${target}_FILE NAMES "${file}"
+                 PATHS "/usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}" NO_DEFAULT_PATH
+                 NO_CMAKE_FIND_ROOT_PATH)
+    if(NOT ${target}_FILE)
+        message(FATAL_ERROR "/usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}/${file} is missing: run "
+                            "script/bootstrap first")
+    endif()
+    target_link_libraries(${target} INTERFACE "${${target}_FILE}")
 endfunction()
 
 vexa_header_only(HeaderOnlyBoost boost json.hpp)
@@ -30,6 +50,17 @@ vexa_header_only(HeaderOnlyCli CLI CLI.hpp)
 vexa_header_only(HeaderOnlySpdlog spdlog spdlog.h)
 vexa_header_only(HeaderOnlyFmt fmt format.h)
 vexa_header_only(HeaderOnlySystemd systemd sd-journal.h)
+
+vexa_machine_library(LibEvent libevent_core-2.1.so.7 event2 event.h)
+vexa_machine_library(LibUdev libudev.so.1 libudev.h)
+vexa_machine_library(LibEvdev libevdev.so.2 libevdev-1.0 libevdev/libevdev.h)
+# Its headers include each other without the folder of the version.
+if(CMAKE_CROSSCOMPILING)
+    target_include_directories(LibEvdev SYSTEM INTERFACE
+                               "${PROJECT_BINARY_DIR}/header-only/libevdev-1.0")
+else()
+    target_include_directories(LibEvdev SYSTEM INTERFACE /usr/include/libevdev-1.0)
+endif()
 
 # Trace points are one header that serves every machine; Debian keeps it with the host's own.
 find_file(VEXA_SDT_HEADER sys/sdt.h PATHS /usr/include
@@ -41,39 +72,6 @@ if(CMAKE_CROSSCOMPILING)
          DESTINATION "${PROJECT_BINARY_DIR}/header-only-sdt/sys")
     target_include_directories(HeaderOnlySdt SYSTEM INTERFACE
                                "${PROJECT_BINARY_DIR}/header-only-sdt")
-endif()
-
-# The header stands in a folder of its own. A cross build finds the target machine's library where
-# Debian puts it; without one it still builds whatever has no keyboard.
-find_path(VEXA_LIBEVDEV_HEADERS libevdev/libevdev.h PATHS /usr/include PATH_SUFFIXES libevdev-1.0
-          NO_CMAKE_FIND_ROOT_PATH)
-if(NOT VEXA_LIBEVDEV_HEADERS)
-    message(FATAL_ERROR "libevdev/libevdev.h is missing: run script/bootstrap first")
-endif()
-find_library(VEXA_LIBEVDEV evdev
-             PATHS "/usr/lib/${CMAKE_SYSTEM_PROCESSOR}-linux-gnu" NO_CMAKE_FIND_ROOT_PATH
-             NO_DEFAULT_PATH)
-if(NOT VEXA_LIBEVDEV)
-    set(VEXA_LIBEVDEV evdev)
-endif()
-add_library(Libevdev INTERFACE)
-target_include_directories(Libevdev SYSTEM INTERFACE "${VEXA_LIBEVDEV_HEADERS}")
-target_link_libraries(Libevdev INTERFACE "${VEXA_LIBEVDEV}")
-# A library to be linked. A cross build that has none for its machine compiles all the same; what
-# uses it cannot be linked then.
-add_library(VexaUdev INTERFACE)
-if(NOT EXISTS /usr/include/libudev.h)
-    message(FATAL_ERROR "/usr/include/libudev.h is missing: run script/bootstrap first")
-endif()
-find_library(VEXA_UDEV_LIBRARY udev)
-if(VEXA_UDEV_LIBRARY)
-    target_link_libraries(VexaUdev INTERFACE "${VEXA_UDEV_LIBRARY}")
-elseif(NOT CMAKE_CROSSCOMPILING)
-    message(FATAL_ERROR "libudev is missing: run script/bootstrap first")
-endif()
-if(CMAKE_CROSSCOMPILING)
-    file(COPY /usr/include/libudev.h DESTINATION "${PROJECT_BINARY_DIR}/header-only-udev")
-    target_include_directories(VexaUdev SYSTEM INTERFACE "${PROJECT_BINARY_DIR}/header-only-udev")
 endif()
 
 if(VEXA_TESTS)

@@ -1,9 +1,11 @@
-# 64-bit Arm by Debian's cross compiler; what it builds runs here under user-mode emulation.
+# 64-bit Arm by Debian's cross compiler; what it builds runs here under user-mode emulation, with the
+# C and C++ libraries of Debian's arm64 packages. Libraries of ours to be linked come from there too,
+# through vexa_machine_library(); nothing else is looked for outside of the compiler's own folder.
 set(CMAKE_SYSTEM_NAME Linux)
 set(CMAKE_SYSTEM_PROCESSOR aarch64)
 set(CMAKE_C_COMPILER aarch64-linux-gnu-gcc)
 set(CMAKE_CXX_COMPILER aarch64-linux-gnu-g++)
-set(CMAKE_CROSSCOMPILING_EMULATOR qemu-aarch64 -L /usr/aarch64-linux-gnu)
+set(CMAKE_CROSSCOMPILING_EMULATOR qemu-aarch64)
 set(CMAKE_FIND_ROOT_PATH /usr/aarch64-linux-gnu)
 set(CMAKE_FIND_ROOT_PATH_MODE_PROGRAM NEVER)
 set(CMAKE_FIND_ROOT_PATH_MODE_LIBRARY ONLY)

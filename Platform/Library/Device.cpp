@@ -3,6 +3,7 @@
 #include <vexa/clock.h>
 
 #include <fcntl.h>
+#include <poll.h>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
@@ -37,6 +38,12 @@ bool isPacketSocket(int descriptor) noexcept {
     socklen_t size = sizeof type;
     return ::getsockopt(descriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 &&
            (type == SOCK_SEQPACKET || type == SOCK_DGRAM);
+}
+
+// What is no socket tells only who asks that its far end is gone.
+bool hasHungUp(int descriptor) noexcept {
+    pollfd state{.fd = descriptor, .events = POLLRDHUP, .revents = 0};
+    return ::poll(&state, 1, 0) > 0;
 }
 
 ssize_t readOnce(int descriptor, std::uint8_t* buffer, std::size_t length) noexcept {
@@ -222,7 +229,7 @@ bool vexa_device::watch() noexcept {
 
 void vexa_device::unwatch() noexcept {
     if (watch_ == 0) return;
-    loop_->unwatch(*mode_, std::exchange(watch_, 0), descriptor_.number());
+    loop_->unwatch(*mode_, std::exchange(watch_, 0));
 }
 
 void vexa_device::leaveLoop() noexcept {
@@ -232,7 +239,7 @@ void vexa_device::leaveLoop() noexcept {
     std::exchange(loop_, nullptr)->release();
 }
 
-bool vexa_device::serve(std::uint64_t watch, std::uint32_t events) noexcept {
+bool vexa_device::serve(std::uint64_t watch, bool isClosed) noexcept {
     Target target;
     std::size_t length = 0;
     std::uint64_t timestamp = 0;
@@ -240,7 +247,7 @@ bool vexa_device::serve(std::uint64_t watch, std::uint32_t events) noexcept {
         const MutexLock lock(mutex_);
         // Closed or unscheduled since the loop looked; it may even be watched anew.
         if (watch != watch_) return false;
-        const std::optional<std::size_t> report = read(events);
+        const std::optional<std::size_t> report = read(isClosed);
         if (!report) return false;
         timestamp = vexa_clock_now();
         length = *report;
@@ -253,20 +260,24 @@ bool vexa_device::serve(std::uint64_t watch, std::uint32_t events) noexcept {
     return true;
 }
 
-std::optional<std::size_t> vexa_device::read(std::uint32_t events) noexcept {
+std::optional<std::size_t> vexa_device::read(bool isClosed) noexcept {
     // A read with no room at all would not even take the report out.
     std::uint8_t noRoom = 0;
     std::uint8_t* const buffer = target_.length > 0 ? target_.buffer : &noRoom;
     const std::size_t room = std::max<std::size_t>(target_.length, 1);
 
-    const bool hungUp = (events & (EPOLLHUP | EPOLLRDHUP | EPOLLERR)) != 0;
     bool isEnd = false;
-    const ssize_t count = hungUp && isPacketSocket_
+    const ssize_t count = isClosed && isPacketSocket_
                               ? readAfterHangUp(descriptor_.number(), buffer, room, isEnd)
                               : readOnce(descriptor_.number(), buffer, room);
-    const bool nothingYet = count < 0 && (errno == EAGAIN || errno == EWOULDBLOCK);
-    if (nothingYet && !hungUp) return std::nullopt;
-    if (count < 0 || isEnd || (count == 0 && hungUp && !isPacketSocket_)) {
+    if (count < 0) {
+        const bool nothingYet = errno == EAGAIN || errno == EWOULDBLOCK;
+        if (nothingYet && !isClosed && !hasHungUp(descriptor_.number())) return std::nullopt;
+        isEnd = true;
+    } else if (count == 0 && !isPacketSocket_) {
+        isEnd = isClosed || hasHungUp(descriptor_.number());
+    }
+    if (isEnd) {
         present_ = false;
         unwatch();
         return std::nullopt;

@@ -41,7 +41,7 @@ public:
 
     [[nodiscard]] bool isPresent() const noexcept { return present_; }
 
-    bool serve(std::uint64_t watch, std::uint32_t events) noexcept override;
+    bool serve(std::uint64_t watch, bool isClosed) noexcept override;
 
 private:
     // The steps between are those in which the back-end is being called.
@@ -63,7 +63,7 @@ private:
     void unwatch() noexcept REQUIRES(mutex_);
     void leaveLoop() noexcept REQUIRES(mutex_);
     /// The report's length, or nothing when there is none; then it may be that the device has gone.
-    std::optional<std::size_t> read(std::uint32_t events) noexcept REQUIRES(mutex_);
+    std::optional<std::size_t> read(bool isClosed) noexcept REQUIRES(mutex_);
 
     std::atomic<std::uint32_t> references_{1};
     std::atomic<bool> present_{true};

@@ -2,6 +2,7 @@
 
 #include "Platform/Library/LogLevels.h"
 #include "Platform/Library/StandardError.h"
+#include "Platform/SignalsBlocked.h"
 
 #include <pthread.h>
 #include <sched.h>
@@ -11,7 +12,6 @@
 #include <cerrno>
 #include <charconv>
 #include <chrono>
-#include <csignal>
 #include <ctime>
 #include <memory>
 #include <utility>
@@ -42,12 +42,11 @@ bool startThread(pthread_t& thread, void* (*body)(void*), void* context) noexcep
     pthread_attr_setschedpolicy(&attributes, SCHED_OTHER);
     pthread_attr_setschedparam(&attributes, &ordinary);
     // Signals are for the program's own threads, and a broken pipe must not end the program here.
-    sigset_t all;
-    sigset_t before;
-    sigfillset(&all);
-    pthread_sigmask(SIG_SETMASK, &all, &before);
-    const bool isStarted = pthread_create(&thread, &attributes, body, context) == 0;
-    pthread_sigmask(SIG_SETMASK, &before, nullptr);
+    bool isStarted = false;
+    {
+        const SignalsBlocked blocked;
+        isStarted = pthread_create(&thread, &attributes, body, context) == 0;
+    }
     pthread_attr_destroy(&attributes);
     if (isStarted) pthread_setname_np(thread, "vexa-log");
     return isStarted;

@@ -1,4 +1,5 @@
 #include "Platform/Library/LiveObjects.h"
+#include "Platform/SignalsBlocked.h"
 
 #include <vexa/queue.h>
 
@@ -7,7 +8,6 @@
 #include <array>
 #include <atomic>
 #include <cerrno>
-#include <csignal>
 #include <cstdint>
 #include <cstring>
 #include <new>
@@ -21,24 +21,6 @@ void waitFor(sem_t& semaphore) noexcept {
     while (::sem_wait(&semaphore) != 0 && errno == EINTR) {
     }
 }
-
-// Signals go to the threads of the program, which expects them.
-class SignalsBlocked {
-public:
-    SignalsBlocked() noexcept {
-        sigset_t all;
-        sigfillset(&all);
-        static_cast<void>(pthread_sigmask(SIG_SETMASK, &all, &before_));
-    }
-    ~SignalsBlocked() { static_cast<void>(pthread_sigmask(SIG_SETMASK, &before_, nullptr)); }
-    SignalsBlocked(const SignalsBlocked&) = delete;
-    SignalsBlocked(SignalsBlocked&&) = delete;
-    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
-    SignalsBlocked& operator=(SignalsBlocked&&) = delete;
-
-private:
-    sigset_t before_{};
-};
 
 // The queue whose thread this is.
 constinit thread_local const vexa_queue* current = nullptr;
@@ -108,7 +90,7 @@ private:
 
     bool start(const char* label) noexcept {
         if (label) std::strncpy(name_.data(), label, name_.size() - 1);
-        const SignalsBlocked blocked;
+        const Vexa::SignalsBlocked blocked;
         const auto body = [](void* queue) -> void* {
             static_cast<vexa_queue*>(queue)->work();
             return nullptr;

@@ -2,19 +2,21 @@
 
 #include <vexa/clock.h>
 
-#include <sys/epoll.h>
+#include <event2/event.h>
 #include <sys/eventfd.h>
+#include <sys/time.h>
 #include <algorithm>
 #include <array>
-#include <cerrno>
 #include <climits>
 #include <cstddef>
 #include <exception>
 #include <limits>
+#include <list>
 #include <new>
 #include <string_view>
 #include <utility>
 
+using Vexa::Mutex;
 using Vexa::MutexLock;
 using Vexa::Library::FileDescriptor;
 
@@ -26,20 +28,71 @@ struct Task {
     void* context;
 };
 
+struct FreeBase {
+    void operator()(event_base* base) const noexcept { event_base_free(base); }
+};
+struct FreeConfig {
+    void operator()(event_config* config) const noexcept { event_config_free(config); }
+};
+struct FreeEvent {
+    void operator()(event* freed) const noexcept { event_free(freed); }
+};
+using Base = std::unique_ptr<event_base, FreeBase>;
+using Event = std::unique_ptr<event, FreeEvent>;
+
+// Whether that many descriptors can still be opened.
+template <std::size_t kCount>
+bool canOpen() noexcept {
+    std::array<FileDescriptor, kCount> opened;
+    return std::ranges::all_of(opened, [](FileDescriptor& each) {
+        each = FileDescriptor(::eventfd(0, EFD_CLOEXEC));
+        return static_cast<bool>(each);
+    });
+}
+
+// Null: no memory, no descriptors.
+Base makeBase() noexcept {
+    const std::unique_ptr<event_config, FreeConfig> config(event_config_new());
+    // On epoll whatever the environment says: nothing else tells that a socket's far end closed.
+    if (!config ||
+        event_config_require_features(config.get(), EV_FEATURE_O1 | EV_FEATURE_EARLY_CLOSE) != 0 ||
+        event_config_set_flag(config.get(), EVENT_BASE_FLAG_IGNORE_ENV) != 0 ||
+        event_config_set_flag(config.get(), EVENT_BASE_FLAG_NOLOCK) != 0) {
+        return nullptr;
+    }
+    // An epoll set and a pair of its own for signals. libevent ends the process when it gets the
+    // set and not the pair.
+    if (!canOpen<3>()) return nullptr;
+    return Base(event_base_new_with_config(config.get()));
+}
+
+// What a wait found: the numbers of watches. What has no room shows itself to the next.
+class Ready {
+public:
+    struct Entry {
+        std::uint64_t watch;
+        bool isClosed;
+    };
+
+    void add(Entry entry) noexcept { entries_[count_++] = entry; }
+    [[nodiscard]] bool isFull() const noexcept { return count_ == entries_.size(); }
+    [[nodiscard]] const Entry* begin() const noexcept { return entries_.data(); }
+    [[nodiscard]] const Entry* end() const noexcept { return entries_.data() + count_; }
+
+private:
+    std::array<Entry, 32> entries_;  // set as far as count_
+    std::size_t count_ = 0;
+};
+
 struct Watch {
     std::uint64_t number;
     Vexa::Library::Source* source;
+    Vexa::Library::Mode* mode;
+    Event event;
 };
 
-// The number in the epoll sets under which the loop itself is woken.
+// The watch of no source: the loop itself is woken.
 constexpr std::uint64_t kWake = 0;
-
-bool add(const FileDescriptor& set, int descriptor, std::uint32_t events, std::uint64_t number) {
-    epoll_event event{};
-    event.events = events;
-    event.data.u64 = number;
-    return ::epoll_ctl(set.number(), EPOLL_CTL_ADD, descriptor, &event) == 0;
-}
 
 // A point in time in host ticks, or never.
 class Deadline {
@@ -53,8 +106,8 @@ public:
 
     [[nodiscard]] bool isOver() const noexcept { return at_ != kNever && vexa_clock_now() >= at_; }
 
-    // Milliseconds from now, rounded up, as epoll_wait takes them. A long time is cut: the wait
-    // then ends early and is repeated.
+    // Milliseconds from now, rounded up, or -1 for ever. A long time is cut: the wait then
+    // ends early and is repeated.
     [[nodiscard]] int remaining() const noexcept {
         if (at_ == kNever) return -1;
         const std::uint64_t now = vexa_clock_now();
@@ -71,13 +124,93 @@ private:
 
 }  // namespace
 
+/// libevent's own locks are not used: their callbacks are the whole process's, which may use
+/// libevent itself and have chosen others, and none of those that it brings lend priority. Instead
+/// who waits or changes what is waited for holds `inside`; who cannot get it, since the loop waits,
+/// stands in the `door`, through which the loop must pass before it waits again.
 struct Vexa::Library::Mode {
-    FileDescriptor set{::epoll_create1(EPOLL_CLOEXEC)};
+    Mutex door{};
+    Mutex inside{};
+    Base base{makeBase()};
+    Watch wake{.number = kWake, .source = nullptr, .mode = this, .event = {}};
+    Event timer{};
+    Ready* ready GUARDED_BY(inside) = nullptr;
+
     // Guarded by the loop's lock.
     std::deque<Task> tasks{};
-    std::vector<Watch> watches{};
+    std::list<Watch> watches{};
     // Whether there are tasks, to be asked without the lock.
     std::atomic<bool> hasTasks{false};
+
+    bool begin(const FileDescriptor& wakeDescriptor) noexcept;
+    bool wait(int milliseconds, Ready& found) noexcept;
+
+    static Event makeEvent(Watch& watch, int descriptor) noexcept {
+        return Event(event_new(watch.mode->base.get(), descriptor, EV_READ | EV_CLOSED | EV_PERSIST,
+                               &Mode::takeDown, &watch));
+    }
+    static void takeDown(evutil_socket_t descriptor, short what, void* watch) noexcept;
+};
+
+// False: no memory, no descriptors.
+bool Vexa::Library::Mode::begin(const FileDescriptor& wakeDescriptor) noexcept {
+    if (!base) return false;
+    timer.reset(event_new(base.get(), -1, 0, [](evutil_socket_t, short, void*) {}, nullptr));
+    wake.event = makeEvent(wake, wakeDescriptor.number());
+    return timer && wake.event && event_add(wake.event.get(), nullptr) == 0;
+}
+
+// Waits, -1 for ever, and takes down what is ready. Nothing when it was interrupted or when the
+// time is over, roughly: libevent reads a clock that may be a few milliseconds behind. False: it
+// failed.
+bool Vexa::Library::Mode::wait(int milliseconds, Ready& found) noexcept {
+    // Who stands in the door goes first.
+    door.lock();
+    door.unlock();
+    const MutexLock lock(inside);
+    int flags = EVLOOP_ONCE;
+    if (milliseconds == 0) flags |= EVLOOP_NONBLOCK;
+    if (milliseconds > 0) {
+        const timeval time{.tv_sec = milliseconds / 1000,
+                           .tv_usec = suseconds_t{milliseconds % 1000} * 1000};
+        if (event_add(timer.get(), &time) != 0) return false;
+    }
+    ready = &found;
+    const bool isDone = event_base_loop(base.get(), flags) >= 0;
+    ready = nullptr;
+    if (milliseconds > 0) static_cast<void>(event_del(timer.get()));
+    return isDone;
+}
+
+// From within `wait`.
+void Vexa::Library::Mode::takeDown(evutil_socket_t /*descriptor*/, short what,
+                                   void* watch) noexcept NO_THREAD_SAFETY_ANALYSIS {
+    const Watch& found = *static_cast<const Watch*>(watch);
+    const Mode& mode = *found.mode;
+    mode.ready->add({.watch = found.number, .isClosed = (what & EV_CLOSED) != 0});
+    if (mode.ready->isFull()) static_cast<void>(event_base_loopbreak(mode.base.get()));
+}
+
+/// While it lives, the loop is not in the mode's wait, which it leaves for that, and what is waited
+/// for may be changed.
+class SCOPED_CAPABILITY vexa_run_loop::Outside {
+public:
+    Outside(vexa_run_loop& loop, Mode& mode) noexcept ACQUIRE(mode.inside) NO_THREAD_SAFETY_ANALYSIS
+        : lock_(mode.door),
+          inside_(mode.inside) {
+        if (inside_.tryLock()) return;
+        loop.wake();
+        inside_.lock();
+    }
+    ~Outside() RELEASE() NO_THREAD_SAFETY_ANALYSIS { inside_.unlock(); }
+    Outside(const Outside&) = delete;
+    Outside(Outside&&) = delete;
+    Outside& operator=(const Outside&) = delete;
+    Outside& operator=(Outside&&) = delete;
+
+private:
+    const MutexLock lock_;
+    Mutex& inside_;
 };
 
 /// A run in progress, on the stack of the loop's thread.
@@ -163,7 +296,7 @@ vexa_run_loop::Mode* vexa_run_loop::mode(const char* name) noexcept {
     }
     try {
         auto made = std::make_unique<Mode>();
-        if (!made->set || !add(made->set, wake_.number(), EPOLLIN, kWake)) return nullptr;
+        if (!made->begin(wake_)) return nullptr;
         return modes_.emplace(name, std::move(made)).first->second.get();
     } catch (const std::exception&) {
         return nullptr;  // no memory
@@ -190,22 +323,18 @@ vexa_run_result vexa_run_loop::run(const char* modeName, std::uint64_t timeoutNa
 vexa_run_result vexa_run_loop::serve(Mode& mode, Run& run, std::uint64_t timeoutNanoseconds,
                                      bool returnAfterSource) noexcept {
     const Deadline deadline(timeoutNanoseconds);
-    std::array<epoll_event, 8> events{};
     for (;;) {
         if (mode.hasTasks && runTasks(mode, run, returnAfterSource) && returnAfterSource) {
             return VEXA_RUN_HANDLED;
         }
         if (run.stopped) return VEXA_RUN_STOPPED;
 
-        const int timeout = mode.hasTasks ? 0 : deadline.remaining();
-        const int ready = ::epoll_wait(mode.set.number(), events.data(),
-                                       static_cast<int>(events.size()), timeout);
-        if (ready < 0 && errno != EINTR) return VEXA_RUN_FAILED;
-        for (int i = 0; i < ready; ++i) {
-            const epoll_event& event = events[static_cast<std::size_t>(i)];
-            if (event.data.u64 == kWake) {
+        Ready ready;
+        if (!mode.wait(mode.hasTasks ? 0 : deadline.remaining(), ready)) return VEXA_RUN_FAILED;
+        for (const auto& [watch, isClosed] : ready) {
+            if (watch == kWake) {
                 takeSignal();
-            } else if (serveSource(mode, event.data.u64, event.events) && returnAfterSource) {
+            } else if (serveSource(mode, watch, isClosed) && returnAfterSource) {
                 return VEXA_RUN_HANDLED;
             }
             // What else is ready shows itself to the next run again.
@@ -237,7 +366,7 @@ bool vexa_run_loop::runTasks(Mode& mode, const Run& run, bool onlyOne) noexcept 
     return ran;
 }
 
-bool vexa_run_loop::serveSource(Mode& mode, std::uint64_t watch, std::uint32_t events) noexcept {
+bool vexa_run_loop::serveSource(Mode& mode, std::uint64_t watch, bool isClosed) noexcept {
     Source* source = nullptr;
     {
         const MutexLock lock(mutex_);
@@ -245,7 +374,7 @@ bool vexa_run_loop::serveSource(Mode& mode, std::uint64_t watch, std::uint32_t e
         if (found == mode.watches.end() || !found->source->tryRetain()) return false;
         source = found->source;
     }
-    const bool served = source->serve(watch, events);
+    const bool served = source->serve(watch, isClosed);
     source->release();
     return served;
 }
@@ -294,22 +423,31 @@ void vexa_run_loop::takeSignal() noexcept {
 }
 
 std::uint64_t vexa_run_loop::watch(Mode& mode, Source& source, int descriptor) noexcept {
-    const MutexLock lock(mutex_);
-    const std::uint64_t number = ++lastWatch_;
+    // Made aside: an event cannot be in the base before it can be found.
+    std::list<Watch> made;
     try {
-        mode.watches.push_back({.number = number, .source = &source});
+        made.push_back({.number = 0, .source = &source, .mode = &mode, .event = {}});
     } catch (const std::bad_alloc&) {
         return 0;
     }
-    if (add(mode.set, descriptor, EPOLLIN | EPOLLRDHUP, number)) return number;
-    mode.watches.pop_back();
-    return 0;
+    Watch& watch = made.front();
+    watch.event = Mode::makeEvent(watch, descriptor);
+    if (!watch.event) return 0;
+    const Outside outside(*this, mode);
+    const MutexLock lock(mutex_);
+    watch.number = ++lastWatch_;
+    if (event_add(watch.event.get(), nullptr) != 0) {
+        made.clear();  // while we are outside
+        return 0;
+    }
+    mode.watches.splice(mode.watches.end(), made);
+    return watch.number;
 }
 
-void vexa_run_loop::unwatch(Mode& mode, std::uint64_t watch, int descriptor) noexcept {
+void vexa_run_loop::unwatch(Mode& mode, std::uint64_t watch) noexcept {
+    const Outside outside(*this, mode);
     const MutexLock lock(mutex_);
-    static_cast<void>(::epoll_ctl(mode.set.number(), EPOLL_CTL_DEL, descriptor, nullptr));
-    std::erase_if(mode.watches, [watch](const Watch& each) { return each.number == watch; });
+    mode.watches.remove_if([watch](const Watch& each) { return each.number == watch; });
 }
 
 extern "C" {

@@ -22,9 +22,10 @@ public:
     /// One more reference, or false when the last one is gone already. Takes no lock.
     virtual bool tryRetain() noexcept = 0;
     virtual void release() noexcept = 0;
-    /// The descriptor of this watch shows these events (of epoll). Answers whether something was
-    /// served. The watch may have ended meanwhile.
-    virtual bool serve(std::uint64_t watch, std::uint32_t events) noexcept = 0;
+    /// The descriptor of this watch can be read; whether it is a socket whose far end has closed.
+    /// What else ends a descriptor (EPOLLHUP, EPOLLERR) shows itself as readable. Answers whether
+    /// something was served. The watch may have ended meanwhile.
+    virtual bool serve(std::uint64_t watch, bool isClosed) noexcept = 0;
 
 protected:
     Source() = default;
@@ -40,13 +41,13 @@ struct Mode;
 
 }  // namespace Vexa::Library
 
-/// The loop waits in level-triggered epoll sets of its own, one a mode, in which a descriptor stays
-/// from its first moment to its last. A report then costs one wait and one read. Reactors that are
-/// edge-triggered inside (Asio's is) need a call more for each: a second read that finds nothing,
-/// or arming the descriptor anew.
+/// The loop waits in libevent, in a base of its own for each mode, in which a descriptor stays from
+/// its first moment to its last. Since libevent's epoll is level-triggered, a report costs one wait
+/// and one read. libevent only says what is ready; the loop serves it when the wait is over, so
+/// that runs inside of runs never enter libevent twice.
 ///
-/// In the steady state no lock of the loop is held while anything is called, and the only one taken
-/// lends priority.
+/// In the steady state no lock of the loop is held while anything is called, and those taken lend
+/// priority.
 struct vexa_run_loop final : private Vexa::Library::Counted<VEXA_OBJECT_RUN_LOOP> {
 public:
     using Mode = Vexa::Library::Mode;
@@ -71,12 +72,15 @@ public:
     /// The mode by name, made when it is new; null: no memory, no descriptors.
     Mode* mode(const char* name) noexcept;
     /// Watches a descriptor in the mode; answers the watch's number, 0 when it cannot be watched.
+    /// On another thread this and `unwatch` wake the loop and wait until it is out of its wait.
     std::uint64_t watch(Mode& mode, Source& source, int descriptor) noexcept;
-    void unwatch(Mode& mode, std::uint64_t watch, int descriptor) noexcept;
+    /// To be called before the descriptor is closed.
+    void unwatch(Mode& mode, std::uint64_t watch) noexcept;
 
 private:
     struct Run;
     class OfThread;
+    class Outside;
 
     vexa_run_loop();
     ~vexa_run_loop();
@@ -85,7 +89,7 @@ private:
     vexa_run_result serve(Mode& mode, Run& run, std::uint64_t timeoutNanoseconds,
                           bool returnAfterSource) noexcept;
     bool runTasks(Mode& mode, const Run& run, bool onlyOne) noexcept;
-    bool serveSource(Mode& mode, std::uint64_t watch, std::uint32_t events) noexcept;
+    bool serveSource(Mode& mode, std::uint64_t watch, bool isClosed) noexcept;
     void takeSignal() noexcept;
 
     std::atomic<std::uint32_t> references_{1};

@@ -504,6 +504,55 @@ TEST_F(HidDeviceTest, TwoShareALoop) {
     });
 }
 
+// More than one wait tells of at once.
+TEST_F(HidDeviceTest, ManyShareALoopAndEachHasItsTurn) {
+    constexpr std::size_t kDevices = 40;
+    struct Stand {
+        std::shared_ptr<ScriptedDevice> scripted = std::make_shared<ScriptedDevice>();
+        DeviceRegistration registration{scripted};
+        HidDevice device = HidDevice::create(registration.service());
+        Reader reader;
+    };
+    std::jthread([&] {
+        const RunLoop loop = RunLoop::current();
+        std::vector<std::unique_ptr<Stand>> stands;
+        for (std::size_t i = 0; i < kDevices; ++i) {
+            Stand& stand = *stands.emplace_back(std::make_unique<Stand>());
+            stand.reader.registerWith(stand.device);
+            EXPECT_EQ(stand.device.schedule(loop, kMode), VEXA_STATUS_SUCCESS);
+            EXPECT_EQ(stand.device.open(0), VEXA_STATUS_SUCCESS);
+        }
+        for (std::size_t round = 1; round <= 4; ++round) {
+            for (const auto& stand : stands) stand->scripted->sendReport(Bytes{1});
+            EXPECT_EQ(loop.run(kMode, 0), VEXA_RUN_TIMED_OUT);
+            EXPECT_EQ(loop.run(kMode, 0), VEXA_RUN_TIMED_OUT);
+            for (const auto& stand : stands) EXPECT_THAT(stand->reader.seen(), SizeIs(round));
+        }
+        for (const auto& stand : stands) stand->device.unschedule(loop, kMode);
+    }).join();
+}
+
+TEST_F(HidDeviceTest, JoinsAndLeavesALoopThatWaits) {
+    const LoopThread input;
+    Reader reader;
+    reader.registerWith(device_);
+    for (std::uint64_t i = 1; i <= 200; ++i) {
+        ASSERT_EQ(device_.schedule(input.loop(), kMode), VEXA_STATUS_SUCCESS);
+        ASSERT_EQ(device_.open(0), VEXA_STATUS_SUCCESS);
+        scripted_->sendReport(Bytes{1});
+        ASSERT_TRUE(scripted_->waitUntilHandled(i));
+        // The loop may be in its wait again or just on its way there.
+        if (i % 2 == 0) {
+            device_.unschedule(input.loop(), kMode);
+            device_.close(0);
+        } else {
+            device_.close(0);
+            device_.unschedule(input.loop(), kMode);
+        }
+    }
+    EXPECT_THAT(reader.seen(), SizeIs(200));
+}
+
 TEST_F(HidDeviceTest, CloseLosesWhatWasNotRead) {
     const LoopThread input;
     Reader reader;

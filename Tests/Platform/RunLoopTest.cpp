@@ -2,7 +2,10 @@
 
 #include <gmock/gmock.h>
 
+#include <sys/resource.h>
+#include <unistd.h>
 #include <algorithm>
+#include <array>
 #include <atomic>
 #include <chrono>
 #include <cstdint>
@@ -319,6 +322,27 @@ TEST(RunLoop, IsGoneForWhatEndsAfterItInItsThread) {
         static thread_local Late late;
         static_cast<void>(late);
         EXPECT_NE(vexa_run_loop_current(), nullptr);
+    });
+}
+
+// A mode takes three descriptors.
+TEST(RunLoop, FailsToRunInANewModeWithoutDescriptorsLeft) {
+    onThread([] {
+        const RunLoop loop = RunLoop::current();
+        rlimit before{};
+        ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &before), 0);
+        const int next = ::dup(STDOUT_FILENO);
+        ASSERT_GE(next, 0);
+        ::close(next);
+        for (const rlim_t left : std::to_array<rlim_t>({0, 1, 2})) {
+            rlimit few = before;
+            few.rlim_cur = static_cast<rlim_t>(next) + left;
+            ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &few), 0);
+            const vexa_run_result result = loop.run(kMode, 0);
+            ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
+            EXPECT_EQ(result, VEXA_RUN_FAILED) << left;
+        }
+        EXPECT_EQ(loop.run(kMode, 0), VEXA_RUN_TIMED_OUT);
     });
 }
 
