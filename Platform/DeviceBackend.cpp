@@ -57,8 +57,7 @@ constexpr vexa_device_backend kTable{
     .report_handled = [](void* context) { backendOf(context).reportHandled(); },
     .destroy = [](void* context) { delete static_cast<Owner*>(context); },
     .report_arrived =
-        [](void* context, const std::uint8_t* report, std::size_t length,
-           std::uint64_t timestamp) {
+        [](void* context, const std::uint8_t* report, std::size_t length, std::uint64_t timestamp) {
             backendOf(context).reportArrived({report, length}, timestamp);
         },
 };

@@ -77,9 +77,10 @@ public:
     Vexa::PropertyValue property(const Vexa::PropertyValue& key) noexcept override;
     bool setProperty(const Vexa::PropertyValue& key,
                      const Vexa::PropertyValue& value) noexcept override;
+    // The library calls both in turn, on one thread: what the first takes the second gives back.
     void reportArrived(std::span<const std::uint8_t> report,
-                       std::uint64_t timestamp) noexcept override;
-    void reportHandled() noexcept override;
+                       std::uint64_t timestamp) noexcept override NO_THREAD_SAFETY_ANALYSIS;
+    void reportHandled() noexcept override NO_THREAD_SAFETY_ANALYSIS;
 
 private:
     const std::shared_ptr<Vexa::DeviceBackend> device_;

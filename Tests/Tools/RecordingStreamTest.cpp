@@ -243,7 +243,7 @@ TEST(RecordingStreamTest, CutInTheMiddleOfAWriteLosesThatFrameAlone) {
 TEST(RecordingStreamTest, FullDiskKeepsAWholeRecordingOfAllThatHasRoom) {
     const Frames frames = someFrames();
     const std::size_t most = textOf(frames, frames.size()).size();
-    for (const std::size_t atOnce : {1, 3, 100}) {
+    for (const unsigned atOnce : {1U, 3U, 100U}) {
         for (std::size_t room = textOf(frames, 0).size(); room < most; ++room) {
             SCOPED_TRACE(std::to_string(room) + " bytes, " + std::to_string(atOnce) + " at once");
             Disk disk{.room = room};

@@ -60,8 +60,7 @@ typedef struct vexa_device_backend {
     /* Called on the run loop's thread with each report, before the callback gets the same bytes and
      * time; they are only good during the call. For each there is one `report_handled` later, on
      * the same thread. NULL: not told. Must not block. Since ABI 1.1. */
-    void (*report_arrived)(void* context, const uint8_t* report, size_t length,
-                           uint64_t timestamp);
+    void (*report_arrived)(void* context, const uint8_t* report, size_t length, uint64_t timestamp);
 } vexa_device_backend;
 
 VEXA_BEGIN_C
