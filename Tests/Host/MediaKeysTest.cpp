@@ -57,11 +57,12 @@ TEST_F(MediaKeysTest, TapPressesAndReleases) {
 }
 
 TEST_F(MediaKeysTest, HoldKeepsItsKeyDownUntilItEnds) {
-    const std::vector<std::string> names = {"KEY_ASSISTANT", "KEY_VOLUMEDOWN", "KEY_VOLUMEUP"};
-    for (PixelRegion region = 1; region <= 3; ++region) {
+    PixelRegion region = 0;
+    for (const std::string key : {"KEY_ASSISTANT", "KEY_VOLUMEDOWN", "KEY_VOLUMEUP"}) {
+        ++region;
         EXPECT_EQ(after(Algs::createMayBeginEvent(region)), "");
-        EXPECT_EQ(after(Algs::createHoldStartEvent(region)), '+' + names[region - 1] + " |");
-        EXPECT_EQ(after(Algs::createHoldEndEvent(region)), '-' + names[region - 1] + " |");
+        EXPECT_EQ(after(Algs::createHoldStartEvent(region)), '+' + key + " |");
+        EXPECT_EQ(after(Algs::createHoldEndEvent(region)), '-' + key + " |");
     }
 }
 
