@@ -45,6 +45,7 @@ TEST(DeviceBackend, DoesNothingElseUnlessOverridden) {
     EXPECT_EQ(backend.getReport(VEXA_REPORT_FEATURE, 4, buffer, length), VEXA_STATUS_UNSUPPORTED);
     EXPECT_FALSE(backend.property("key"));
     EXPECT_FALSE(backend.setProperty("key", 1));
+    backend.reportArrived({});
     backend.reportHandled();
 }
 
