@@ -15,7 +15,7 @@
 
 namespace Vexa {
 
-/// The properties that a hidraw device answers for; <key, what it is>.
+/// The properties that a hidraw device answers for. docs/operations.md has the same table.
 namespace HidrawKey {
 
 inline constexpr std::string_view kBus = "Bus";

@@ -14,6 +14,8 @@
 #include <array>
 #include <condition_variable>
 #include <cstdint>
+#include <fstream>
+#include <iterator>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -127,6 +129,16 @@ TEST_F(HidrawDeviceTest, TellsWhatItIs) {
     for (const auto& entry : Vexa::HidrawKey::kAll) {
         EXPECT_TRUE(device.property(entry.key)) << entry.key;
     }
+}
+
+TEST_F(HidrawDeviceTest, AnswersForTheKeysOfTheManualAndNoOthers) {
+    std::ifstream stream(VEXA_SOURCE_DIR "/docs/operations.md");
+    const std::string manual{std::istreambuf_iterator<char>(stream), {}};
+    std::string table = "| key | what it is |\n|---|---|\n";
+    for (const auto& entry : Vexa::HidrawKey::kAll) {
+        table += "| `" + std::string(entry.key) + "` | " + std::string(entry.meaning) + " |\n";
+    }
+    EXPECT_THAT(manual, HasSubstr(table + '\n'));
 }
 
 TEST_F(HidrawDeviceTest, KeepsWhatIsWrittenForItsLife) {

@@ -9,6 +9,8 @@
 
 #include <gmock/gmock.h>
 
+#include <array>
+#include <cstddef>
 #include <filesystem>
 #include <list>
 #include <memory>
@@ -20,8 +22,9 @@
 namespace VexaTouch::Tools {
 
 void PrintTo(const DeviceChoice& choice, std::ostream* stream) {
-    *stream << (choice.kind == DeviceChoice::Kind::Simulated ? "sim" : "recording") << " \""
-            << choice.path << "\" @" << choice.speed;
+    constexpr std::array kKinds = {"sim", "recording", "hidraw"};
+    *stream << kKinds.at(static_cast<std::size_t>(choice.kind)) << " \"" << choice.path << "\" @"
+            << choice.speed;
 }
 
 namespace {
@@ -52,6 +55,18 @@ TEST(DeviceChoiceTest, TheSimulatedSurfacePlaysRandomGesturesOrAScript) {
     EXPECT_EQ(DeviceChoice::parse("sim:a:b@2"), (DeviceChoice{Kind::Simulated, "a:b@2", 1.0}));
 }
 
+TEST(DeviceChoiceTest, ADeviceOfTheKernelIsTheFirstOrThatOfANode) {
+    EXPECT_EQ(DeviceChoice::parse("hidraw"), (DeviceChoice{Kind::Hidraw, "", 1.0}));
+    EXPECT_EQ(DeviceChoice::parse("hidraw:/dev/hidraw1"),
+              (DeviceChoice{Kind::Hidraw, "/dev/hidraw1", 1.0}));
+    EXPECT_EQ(refusal("hidraw:"),
+              "--device hidraw:: the node is missing (without the colon: the first surface there "
+              "is)");
+    EXPECT_FALSE(DeviceChoice::parse("hidraw:/dev/hidraw1").ends());
+    EXPECT_FALSE(DeviceChoice::parse("sim").ends());
+    EXPECT_TRUE(DeviceChoice::parse("sim:a").ends());
+}
+
 TEST(DeviceChoiceTest, ARecordingMayHaveASpeed) {
     const auto recording = [](const char* path, double speed) {
         return DeviceChoice{Kind::Recording, path, speed};
@@ -80,9 +95,10 @@ TEST(DeviceChoiceTest, AnAtSignThatNoSpeedFollowsBelongsToTheName) {
 }
 
 TEST(DeviceChoiceTest, WhatIsNoDeviceIsRefused) {
-    EXPECT_EQ(refusal("mouse"),
-              "--device mouse: expected sim, sim:SCRIPT or recording:FILE, with @2 or @max behind "
-              "the file for a speed");
+    EXPECT_EQ(
+        refusal("mouse"),
+        "--device mouse: expected sim, sim:SCRIPT, recording:FILE (with @2 or @max behind the "
+        "file for a speed), hidraw or hidraw:NODE");
     EXPECT_THAT(refusal(""), HasSubstr("expected sim"));
     EXPECT_THAT(refusal("Sim"), HasSubstr("expected sim"));
     EXPECT_THAT(refusal("simulated"), HasSubstr("expected sim"));

@@ -51,7 +51,7 @@ public:
     static constexpr std::uint64_t kPatienceNs = 60'000'000'000;
 
     /// `hooks` are called besides the reader's own.
-    explicit DeviceReader(const std::shared_ptr<Tools::PlayedDevice>& played,
+    explicit DeviceReader(const std::shared_ptr<Tools::ObservedDevice>& played,
                           Tools::DeviceHooks hooks = {})
         : registration_(played), device_(Vexa::HidDevice::create(registration_.service())) {
         hooks.onStateFrame = [this, also = std::move(hooks.onStateFrame)](
