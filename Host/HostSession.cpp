@@ -62,6 +62,10 @@ HostSession::~HostSession() {
 }
 
 void HostSession::begin(std::uint32_t options) {
+    if (scheduled_) {
+        // A service that is scheduled twice runs two threads, of which only one can be ended.
+        throw std::logic_error(file_ + ": begins again without having been halted");
+    }
     service_.schedule(queue_.get());
     scheduled_ = true;
     options_ = options;

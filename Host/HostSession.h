@@ -41,8 +41,9 @@ public:
     HostSession& operator=(HostSession&&) = delete;
 
     /// Schedules the service on the session's queue and opens the device: events come from now on.
-    /// May be called again after halt(). Throws HostFailure when the device does not open; the
-    /// session is then as it was before.
+    /// May be called again after halt(), not before it: throws std::logic_error then and changes
+    /// nothing. Throws HostFailure when the device does not open; the session is then as it was
+    /// before.
     void begin(std::uint32_t options = 0);
 
     /// Undoes begin(): no event is made any more, and all that were have been delivered when it

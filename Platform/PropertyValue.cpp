@@ -141,13 +141,13 @@ bool operator==(const PropertyValue::ArrayView& a, const PropertyValue::Array& b
 PropertyValue::DictionaryView::value_type PropertyValue::DictionaryView::item(
     std::size_t index) const noexcept {
     std::size_t length = 0;
-    const char* key = vexa_value_get_key(dictionary_, index, &length);
-    return {std::string_view(key, length), share(vexa_value_get_element(dictionary_, index))};
+    const char* key = vexa_value_get_key(container(), index, &length);
+    return {std::string_view(key, length), share(vexa_value_get_element(container(), index))};
 }
 
 PropertyValue::DictionaryView::const_iterator PropertyValue::DictionaryView::find(
     std::string_view key) const noexcept {
-    return {*this, std::min(vexa_value_find_key(dictionary_, key.data(), key.size()), size())};
+    return {*this, std::min(vexa_value_find_key(container(), key.data(), key.size()), size())};
 }
 
 PropertyValue PropertyValue::DictionaryView::at(std::string_view key) const {

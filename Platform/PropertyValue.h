@@ -229,90 +229,98 @@ private:
     std::size_t index_ = 0;
 };
 
+/// What the views of arrays and of dictionaries have in common: a range of elements by index, each
+/// of which the view makes when it is asked for.
+template <class View, class Element>
+class PropertyView {
+public:
+    using value_type = Element;
+    using size_type = std::size_t;
+    using difference_type = std::ptrdiff_t;
+    using reference = value_type;
+    using const_reference = value_type;
+    using const_iterator = PropertyIterator<View>;
+    using iterator = const_iterator;
+
+    [[nodiscard]] std::size_t size() const noexcept { return vexa_value_get_count(container_); }
+    [[nodiscard]] bool empty() const noexcept { return size() == 0; }
+    [[nodiscard]] const_iterator begin() const noexcept { return {view(), 0}; }
+    [[nodiscard]] const_iterator end() const noexcept { return {view(), size()}; }
+
+    /// Element by element.
+    friend bool operator==(const View& a, const View& b) noexcept {
+        return vexa_value_equal(a.container(), b.container());
+    }
+
+protected:
+    PropertyView() noexcept = default;
+    explicit PropertyView(const vexa_value* container) noexcept : container_(container) {}
+    ~PropertyView() = default;
+    PropertyView(const PropertyView&) noexcept = default;
+    PropertyView& operator=(const PropertyView&) noexcept = default;
+
+    [[nodiscard]] const vexa_value* container() const noexcept { return container_; }
+
+private:
+    [[nodiscard]] const View& view() const noexcept { return static_cast<const View&>(*this); }
+
+    const vexa_value* container_ = nullptr;
+};
+
 }  // namespace Detail
 
 /// The elements of an array, which lives as long as any handle to its value.
-class PropertyValue::ArrayView {
+class PropertyValue::ArrayView
+    : public Detail::PropertyView<PropertyValue::ArrayView, PropertyValue> {
 public:
-    using value_type = PropertyValue;
-    using size_type = std::size_t;
-    using difference_type = std::ptrdiff_t;
-    using reference = PropertyValue;
-    using const_reference = PropertyValue;
-    using const_iterator = Detail::PropertyIterator<ArrayView>;
-    using iterator = const_iterator;
-
     ArrayView() noexcept = default;
 
-    [[nodiscard]] std::size_t size() const noexcept { return vexa_value_get_count(array_); }
-    [[nodiscard]] bool empty() const noexcept { return size() == 0; }
     /// No value beyond the end.
     [[nodiscard]] PropertyValue operator[](std::size_t index) const noexcept { return item(index); }
     /// Throws std::out_of_range beyond the end.
     [[nodiscard]] PropertyValue at(std::size_t index) const;
     [[nodiscard]] PropertyValue front() const noexcept { return item(0); }
     [[nodiscard]] PropertyValue back() const noexcept { return item(size() - 1); }
-    [[nodiscard]] const_iterator begin() const noexcept { return {*this, 0}; }
-    [[nodiscard]] const_iterator end() const noexcept { return {*this, size()}; }
 
-    /// Element by element.
-    friend bool operator==(const ArrayView& a, const ArrayView& b) noexcept {
-        return vexa_value_equal(a.array_, b.array_);
-    }
     friend bool operator==(const ArrayView& a, const Array& b) noexcept;
 
 private:
     friend class PropertyValue;
+    friend PropertyView;
     friend const_iterator;
 
-    explicit ArrayView(const vexa_value* array) noexcept : array_(array) {}
+    explicit ArrayView(const vexa_value* array) noexcept : PropertyView(array) {}
     [[nodiscard]] PropertyValue item(std::size_t index) const noexcept {
-        return share(vexa_value_get_element(array_, index));
+        return share(vexa_value_get_element(container(), index));
     }
-
-    const vexa_value* array_ = nullptr;
 };
 
 /// The members of a dictionary in the order of keys, which live as long as any handle to its value.
 /// Texts of keys live as long, too, and have a zero byte behind them.
-class PropertyValue::DictionaryView {
+class PropertyValue::DictionaryView
+    : public Detail::PropertyView<PropertyValue::DictionaryView,
+                                  std::pair<std::string_view, PropertyValue>> {
 public:
     using key_type = std::string_view;
     using mapped_type = PropertyValue;
-    using value_type = std::pair<std::string_view, PropertyValue>;
-    using size_type = std::size_t;
-    using difference_type = std::ptrdiff_t;
-    using reference = value_type;
-    using const_reference = value_type;
-    using const_iterator = Detail::PropertyIterator<DictionaryView>;
-    using iterator = const_iterator;
 
     DictionaryView() noexcept = default;
 
-    [[nodiscard]] std::size_t size() const noexcept { return vexa_value_get_count(dictionary_); }
-    [[nodiscard]] bool empty() const noexcept { return size() == 0; }
-    [[nodiscard]] const_iterator begin() const noexcept { return {*this, 0}; }
-    [[nodiscard]] const_iterator end() const noexcept { return {*this, size()}; }
     [[nodiscard]] const_iterator find(std::string_view key) const noexcept;
     [[nodiscard]] bool contains(std::string_view key) const noexcept { return find(key) != end(); }
     [[nodiscard]] std::size_t count(std::string_view key) const noexcept { return contains(key); }
     /// Throws std::out_of_range when there is no such member.
     [[nodiscard]] PropertyValue at(std::string_view key) const;
 
-    /// Member by member.
-    friend bool operator==(const DictionaryView& a, const DictionaryView& b) noexcept {
-        return vexa_value_equal(a.dictionary_, b.dictionary_);
-    }
     friend bool operator==(const DictionaryView& a, const Dictionary& b) noexcept;
 
 private:
     friend class PropertyValue;
+    friend PropertyView;
     friend const_iterator;
 
-    explicit DictionaryView(const vexa_value* dictionary) noexcept : dictionary_(dictionary) {}
+    explicit DictionaryView(const vexa_value* dictionary) noexcept : PropertyView(dictionary) {}
     [[nodiscard]] value_type item(std::size_t index) const noexcept;
-
-    const vexa_value* dictionary_ = nullptr;
 };
 
 }  // namespace Vexa

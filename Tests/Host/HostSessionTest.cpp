@@ -10,6 +10,7 @@
 #include <cstring>
 #include <optional>
 #include <sstream>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -203,6 +204,18 @@ TEST_F(HostSessionTest, FailedOpenUnschedulesAndDoesNotClose) {
     EXPECT_THAT(calls(), ElementsAre("schedule", "open 0", "unschedule", "event"));
     session.end();
     EXPECT_THAT(calls(), ElementsAre("Stop", "Release", "Release"));
+}
+
+TEST_F(HostSessionTest, BeginningTwiceIsRefusedAndChangesNothing) {
+    HostSession session(library, kDevice, notingSink());
+    session.begin(kOptions);
+    calls();
+    EXPECT_THROW(session.begin(), std::logic_error);
+    EXPECT_THAT(calls(), IsEmpty());
+    session.halt();
+    EXPECT_THAT(calls(), ElementsAre("close 3", "unschedule", "event"));
+    session.begin();
+    EXPECT_THAT(calls(), ElementsAre("schedule", "open 0"));
 }
 
 TEST_F(HostSessionTest, FailedStopIsToldOnceAllElseIsDone) {

@@ -95,6 +95,24 @@ private:
     std::vector<Seen> seen_;
 };
 
+// Holds a reader in its callback.
+class Held {
+public:
+    explicit Held(Reader& reader) {
+        reader.setReaction([this] {
+            inside_.count_down();
+            goOn_.wait();
+        });
+    }
+
+    void waitUntilInside() const { inside_.wait(); }
+    void goOn() { goOn_.count_down(); }
+
+private:
+    std::latch inside_{1};
+    std::latch goOn_{1};
+};
+
 // Looks for devices and loops that are left over.
 class HidDeviceTest : public testing::Test {
 protected:
@@ -105,6 +123,14 @@ protected:
         registration_.reset();
         scripted_.reset();
         EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_DEVICE), devicesBefore_);
+    }
+
+    // Lets the reports come to the reader, on the loop's thread.
+    void readOn(const LoopThread& input, Reader& reader) const {
+        input.call([&] {
+            reader.registerWith(device_);
+            device_.schedule(input.loop(), kMode);
+        });
     }
 
     std::vector<std::string_view> operations() const {
@@ -290,10 +316,7 @@ TEST_F(HidDeviceTest, ServesReportsWhicheverCameFirstOpenOrSchedule) {
 TEST_F(HidDeviceTest, CutsLongReportsAndDeliversEmptyOnes) {
     const LoopThread input;
     Reader reader(4);
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    readOn(input, reader);
     device_.open(0);
     scripted_->sendReport(Bytes{1, 2, 3, 4});
     scripted_->sendReport(Bytes{5, 6, 7, 8, 9});
@@ -460,10 +483,7 @@ TEST_F(HidDeviceTest, KeepsItsLoopUntilItLeavesIt) {
 TEST_F(HidDeviceTest, GetsNoReportAfterBeingUnscheduled) {
     const LoopThread input;
     Reader reader;
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    readOn(input, reader);
     device_.open(0);
     scripted_->sendReport(Bytes{1});
     ASSERT_TRUE(scripted_->waitUntilHandled(1));
@@ -560,10 +580,7 @@ TEST_F(HidDeviceTest, CloseLosesWhatWasNotRead) {
     scripted_->sendReport(Bytes{1});
     device_.close(0);
     device_.open(0);
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    readOn(input, reader);
     scripted_->sendReport(Bytes{2});
     ASSERT_TRUE(scripted_->waitUntilHandled(1));
     EXPECT_THAT(reader.reports(), ElementsAre(Bytes{2}));
@@ -576,10 +593,7 @@ TEST_F(HidDeviceTest, MayBeClosedFromItsCallback) {
     const LoopThread input;
     Reader reader;
     reader.setReaction([&] { device_.close(1); });
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    readOn(input, reader);
     device_.open(0);
     scripted_->sendReport(Bytes{1});
     EXPECT_TRUE(scripted_->waitUntilHandled(1));
@@ -601,10 +615,7 @@ TEST_F(HidDeviceTest, MayBeReleasedFromItsCallback) {
         EXPECT_EQ(vexa_live_objects(VEXA_OBJECT_DEVICE), devicesBefore_ + 1);
         EXPECT_THAT(operations(), ElementsAre("open"));
     });
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    readOn(input, reader);
     device_.open(0);
     scripted_->sendReport(Bytes{1});
     scripted_->sendReport(Bytes{2});
@@ -623,10 +634,7 @@ TEST_F(HidDeviceTest, MayBeUnscheduledFromItsCallback) {
         device_.unschedule(input.loop(), kMode);
         reader.unregisterFrom(device_);
     });
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    readOn(input, reader);
     device_.open(0);
     scripted_->sendReport(Bytes{1});
     scripted_->sendReport(Bytes{2});
@@ -638,24 +646,16 @@ TEST_F(HidDeviceTest, MayBeUnscheduledFromItsCallback) {
 TEST_F(HidDeviceTest, MayBeClosedByOthersDuringItsCallback) {
     const LoopThread input;
     Reader reader;
-    std::latch inside(1);
-    std::latch closed(1);
-    reader.setReaction([&] {
-        inside.count_down();
-        closed.wait();
-    });
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    Held held(reader);
+    readOn(input, reader);
     device_.open(0);
     scripted_->sendReport(Bytes{1});
     scripted_->sendReport(Bytes{2});
-    inside.wait();
+    held.waitUntilInside();
     // Does not wait for the callback.
     EXPECT_EQ(vexa_device_close(device_.get(), 0), VEXA_STATUS_SUCCESS);
     EXPECT_THAT(operations(), ElementsAre("open", "close"));
-    closed.count_down();
+    held.goOn();
     EXPECT_TRUE(scripted_->waitUntilHandled(1));
     input.call([&] { device_.unschedule(input.loop(), kMode); });
     EXPECT_THAT(reader.reports(), ElementsAre(Bytes{1}));
@@ -664,21 +664,13 @@ TEST_F(HidDeviceTest, MayBeClosedByOthersDuringItsCallback) {
 TEST_F(HidDeviceTest, MayBeReleasedByOthersDuringItsCallback) {
     const LoopThread input;
     Reader reader;
-    std::latch inside(1);
-    std::latch released(1);
-    reader.setReaction([&] {
-        inside.count_down();
-        released.wait();
-    });
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    Held held(reader);
+    readOn(input, reader);
     device_.open(0);
     scripted_->sendReport(Bytes{1});
-    inside.wait();
+    held.waitUntilInside();
     device_.reset();
-    released.count_down();
+    held.goOn();
     EXPECT_TRUE(scripted_->waitUntilOpen(false));
     input.call([] {});
     EXPECT_THAT(operations(), ElementsAre("open", "close"));
@@ -1144,10 +1136,7 @@ TEST_F(HidDeviceTest, SurvivesEverythingAtOnce) {
     scripted_->setFeatureReport(4, {1, 2, 3});
     const LoopThread input;
     Reader reader;
-    input.call([&] {
-        reader.registerWith(device_);
-        device_.schedule(input.loop(), kMode);
-    });
+    readOn(input, reader);
     std::atomic<bool> finished = false;
     {
         std::vector<std::jthread> threads;

@@ -74,6 +74,22 @@ TEST(PublicInterfaceTest, TheLibraryExportsItsInterfaceAndNothingElse) {
     EXPECT_EQ(exportedNames(), declared);
 }
 
+TEST(PublicInterfaceTest, EveryEnumerationMayHoldCodesThatAreNotKnown) {
+    const std::regex enumeration(R"(\benum (\w+)( VEXA_ENUM)? \{)");
+    std::set<std::string> sized;
+    std::set<std::string> unsized;
+    for (const auto& header :
+         std::filesystem::directory_iterator(VEXA_SOURCE_DIR "/Platform/include/vexa")) {
+        std::ifstream file(header.path());
+        const std::string text(std::istreambuf_iterator<char>(file), {});
+        for (std::sregex_iterator it(text.begin(), text.end(), enumeration), end; it != end; ++it) {
+            ((*it)[2].matched ? sized : unsized).insert((*it)[1]);
+        }
+    }
+    EXPECT_THAT(sized, testing::IsSupersetOf({"vexa_log_level", "vexa_value_type"}));
+    EXPECT_THAT(unsized, testing::IsEmpty());
+}
+
 TEST(PublicInterfaceTest, AProgramIsServedByItsOwnMajorVersion) {
     EXPECT_EQ(vexa_abi_version(), VEXA_ABI_VERSION);
     EXPECT_TRUE(vexa_abi_serves(VEXA_ABI_VERSION));

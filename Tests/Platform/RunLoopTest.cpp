@@ -103,17 +103,26 @@ TEST(RunLoop, KeepsAStopThatCameBeforeTheRun) {
     submitted.count_down();
 }
 
+// A thread whose loop runs, and must end by being stopped.
+class RunningLoop {
+public:
+    RunningLoop() { running_.wait(); }
+
+    const RunLoop& loop() const { return loop_; }
+
+private:
+    RunLoop loop_;
+    std::latch running_{1};
+    std::jthread thread_{[this] {
+        loop_ = RunLoop::current();
+        loop_.submit(kMode, [this] { running_.count_down(); });
+        EXPECT_EQ(loop_.run(kMode, kGuard), VEXA_RUN_STOPPED);
+    }};
+};
+
 TEST(RunLoop, IsWokenByATaskFromAnotherThread) {
-    RunLoop loop;
-    std::latch running(1);
-    std::jthread thread([&] {
-        loop = RunLoop::current();
-        loop.submit(kMode, [&] { running.count_down(); });
-        EXPECT_EQ(loop.run(kMode, kGuard), VEXA_RUN_STOPPED);
-    });
-    running.wait();
-    const RunLoop shared = loop;
-    loop.submit(kMode, [shared] { shared.stop(); });
+    const RunningLoop running;
+    running.loop().submit(kMode, [loop = running.loop()] { loop.stop(); });
 }
 
 TEST(RunLoop, ServesOnlyTheModeThatItRunsIn) {
@@ -244,15 +253,8 @@ TEST(RunLoop, StopWithoutARunDoesNothing) {
 }
 
 TEST(RunLoop, StopFromAnotherThreadEndsAWaitingRun) {
-    RunLoop loop;
-    std::latch running(1);
-    std::jthread thread([&] {
-        loop = RunLoop::current();
-        loop.submit(kMode, [&] { running.count_down(); });
-        EXPECT_EQ(loop.run(kMode, kGuard), VEXA_RUN_STOPPED);
-    });
-    running.wait();
-    loop.stop();
+    const RunningLoop running;
+    running.loop().stop();
 }
 
 TEST(RunLoop, WakingServesNothing) {

@@ -9,6 +9,7 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <latch>
 #include <string_view>
 #include <thread>
@@ -123,7 +124,8 @@ TEST(ScriptedDevice, AnswersFalseInsteadOfBlocking) {
     EXPECT_EQ(reader.read(), Bytes{3});
 }
 
-TEST(ScriptedDevice, UnplugWakesABlockedSender) {
+// The sender must give up once this is done to its device.
+void expectToWakeABlockedSender(const std::function<void(ScriptedDevice&)>& end) {
     ScriptedDevice device;
     const Opened reader(device);
     std::latch full(1);
@@ -134,21 +136,15 @@ TEST(ScriptedDevice, UnplugWakesABlockedSender) {
         EXPECT_FALSE(device.sendReport(Bytes{2}));
     });
     full.wait();
-    device.unplug();
+    end(device);
+}
+
+TEST(ScriptedDevice, UnplugWakesABlockedSender) {
+    expectToWakeABlockedSender([](ScriptedDevice& device) { device.unplug(); });
 }
 
 TEST(ScriptedDevice, CloseWakesABlockedSender) {
-    ScriptedDevice device;
-    const Opened reader(device);
-    std::latch full(1);
-    const std::jthread sender([&] {
-        while (device.trySendReport(Bytes{1})) {
-        }
-        full.count_down();
-        EXPECT_FALSE(device.sendReport(Bytes{2}));
-    });
-    full.wait();
-    device.close(0);
+    expectToWakeABlockedSender([](ScriptedDevice& device) { device.close(0); });
 }
 
 TEST(ScriptedDevice, UnplugLeavesWhatWasSentAndThenTheEnd) {

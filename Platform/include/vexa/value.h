@@ -10,7 +10,7 @@
 
 typedef struct vexa_value vexa_value;
 
-typedef enum vexa_value_type {
+typedef enum vexa_value_type VEXA_ENUM {
     VEXA_VALUE_NONE = 0, /* the type of NULL: no value at all */
     VEXA_VALUE_NULL = 1, /* the value null */
     VEXA_VALUE_BOOLEAN = 2,
