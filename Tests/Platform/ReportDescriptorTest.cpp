@@ -147,7 +147,7 @@ TEST(ReportDescriptorTest, OnlyTheOutermostCollectionTellsWhatAReportIsAbout) {
 TEST(ReportDescriptorTest, LongAndReservedItemsArePassedOver) {
     EXPECT_THAT(reportsOf({0xFE, 0x03, 0xF0, 0x81, 0x81, 0x81,  // a long item with three bytes
                            0xFE, 0x00, 0xF1,                    // and with none
-                           0x0C, 0xFD, 0x81,              // reserved type, 0 and 1 bytes
+                           0x0C, 0xFD, 0x81,                    // reserved type, 0 and 1 bytes
                            0x75, 0x08, 0x95, 0x01, 0xF1, 0x55, 0xF5, 0x55, 0xF9, 0x55,  // tags
                            0x81, 0x02}),
                 ElementsAre(Report{kInput, 0, 8, {}, {{0, 0, 0}}}));
