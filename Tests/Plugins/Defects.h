@@ -51,7 +51,7 @@
     DEFECT(WrongRefcon, "events", "random-reports late-callback")                                 \
     DEFECT(WrongSender, "events", "random-reports")                                               \
     DEFECT(TakesLateCallback, "late-callback", "")                                                \
-    DEFECT(UnschedulesLate, "unschedule", "unload")                                               \
+    DEFECT(UnschedulesLate, "unschedule", "unload late-callback")                             \
     DEFECT(IgnoresOpenFailure, "device-failures", "unplug")                                       \
     DEFECT(LosesDescriptorOnFailedOpen, "device-failures", "")                                    \
     DEFECT(IgnoresRefusedProperty, "device-failures", "")                                         \
@@ -71,7 +71,7 @@
            "property-values device-failures unplug destroy cycles memory unload")                 \
     DEFECT(LeavesThreadBehind, "leaks", "unplug memory unload")                                   \
     DEFECT(LeaksMemory, "memory", "")                                                             \
-    DEFECT(LingersAfterUnloading, "unload", "")
+    DEFECT(LingersAfterUnloading, "unload", "memory")
 /* clang-format on */
 
 #endif
