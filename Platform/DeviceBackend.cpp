@@ -28,6 +28,8 @@ void DeviceBackend::reportArrived(std::span<const std::uint8_t> /*report*/,
 
 void DeviceBackend::reportHandled() noexcept {}
 
+void DeviceBackend::scheduled(const RunLoop& /*loop*/, const char* /*mode*/) noexcept {}
+
 namespace {
 
 // The context of a registration: a share in the back-end.
@@ -59,6 +61,10 @@ constexpr vexa_device_backend kTable{
     .report_arrived =
         [](void* context, const std::uint8_t* report, std::size_t length, std::uint64_t timestamp) {
             backendOf(context).reportArrived({report, length}, timestamp);
+        },
+    .scheduled =
+        [](void* context, vexa_run_loop* loop, const char* mode) {
+            backendOf(context).scheduled(RunLoop::share(loop), mode == nullptr ? "" : mode);
         },
 };
 

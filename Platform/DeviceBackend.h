@@ -1,6 +1,7 @@
 #pragma once
 
 #include "Platform/PropertyValue.h"
+#include "Platform/RunLoop.h"
 
 #include <vexa/device.h>
 #include <cstddef>
@@ -38,6 +39,9 @@ public:
                                std::uint64_t timestamp) noexcept;
     /// The service is done with the report that arrived last. On the input thread; must not block.
     virtual void reportHandled() noexcept;
+    /// Its reports are served by this loop in this mode from now on, so that a task submitted there
+    /// runs between them; no loop (and an empty mode): no longer. On the thread that did it.
+    virtual void scheduled(const RunLoop& loop, const char* mode) noexcept;
 };
 
 /// Registers a back-end for as long as it lives. Devices that were made meanwhile go on, and keep

@@ -23,6 +23,13 @@ public:
         return loop;
     }
 
+    /// Takes a reference of its own; NULL gives no loop.
+    static RunLoop share(vexa_run_loop* borrowed) noexcept {
+        RunLoop loop;
+        loop.handle_ = Reference::share(borrowed);
+        return loop;
+    }
+
     /// Serves what is bound to the mode until stopped or the time is over. The loop's own thread.
     vexa_run_result run(const char* mode, std::uint64_t timeoutNanoseconds = VEXA_RUN_FOREVER,
                         bool returnAfterSource = false) const noexcept {

@@ -1,6 +1,10 @@
 #include "Tools/CommandTable.h"
 
 #include "Tools/ConvertCommand.h"
+#include "Tools/Daemon/DaemonCommand.h"
+#include "Tools/Daemon/MonitorCommand.h"
+#include "Tools/Daemon/StatsCommand.h"
+#include "Tools/Daemon/UdevMatchCommand.h"
 #include "Tools/DevicesCommand.h"
 #include "Tools/DiffCommand.h"
 #include "Tools/GetCommand.h"
@@ -24,9 +28,10 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &runCommand,  &recordCommand,  &devicesCommand,  &getCommand,    &setCommand,
-    &keysCommand, &latencyCommand, &validateCommand, &replayCommand, &infoCommand,
-    &showCommand, &convertCommand, &synthCommand,    &diffCommand,
+    &runCommand,      &daemonCommand, &monitorCommand,   &statsCommand, &recordCommand,
+    &devicesCommand,  &getCommand,    &setCommand,       &keysCommand,  &latencyCommand,
+    &validateCommand, &replayCommand, &infoCommand,      &showCommand,  &convertCommand,
+    &synthCommand,    &diffCommand,   &udevMatchCommand,
 };
 
 }  // namespace

@@ -188,6 +188,15 @@ DeviceWishes deviceWishes(const Arguments& arguments, const DeviceChoice& choice
     return wishes;
 }
 
+void refuseWithoutOwnDevice(const Arguments& arguments, std::span<const OptionEntry> options) {
+    for (const OptionEntry& option : options) {
+        if (arguments.given(option.name)) {
+            throw UsageError(std::string(option.name) +
+                             " is for a device of its own; name one with --device");
+        }
+    }
+}
+
 std::shared_ptr<ObservedDevice> makeDevice(const DeviceChoice& choice, const DeviceWishes& wishes,
                                            Streams& streams) {
     if (choice.kind == DeviceChoice::Kind::Simulated) {

@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -64,6 +65,18 @@ inline constexpr OptionEntry kDeviceOption = {.name = "--device",
                                               .defaultValue = "sim",
                                               .kind = ValueKind::Choice,
                                               .choices = "sim sim: recording: hidraw hidraw:"};
+/// The same for those that talk to the daemon unless they have a device of their own.
+inline constexpr OptionEntry kOwnDeviceOption = {
+    .name = "--device",
+    .valueName = "DEVICE",
+    .help =
+        "Use a device of its own instead of the daemon's: sim plays random gestures, "
+        "sim:SCRIPT those of a script, recording:FILE the reports of a recording at their "
+        "recorded times; recording:FILE@2 plays twice as fast, recording:FILE@max as fast as "
+        "the reports are taken; hidraw is the first surface that is plugged in, hidraw:NODE the "
+        "device of that node",
+    .kind = ValueKind::Choice,
+    .choices = "sim sim: recording: hidraw hidraw:"};
 inline constexpr OptionEntry kMatchOption = {
     .name = "--match",
     .valueName = "VENDOR:PRODUCT",
@@ -90,6 +103,10 @@ Host::SurfaceMatch matchOption(const Arguments& arguments, const DeviceChoice& c
 /// What --seed, --rate, --endless and --match say; the command must have all four. Throws
 /// UsageError, also when one is given for a device that has no use of it.
 DeviceWishes deviceWishes(const Arguments& arguments, const DeviceChoice& choice);
+
+/// For a command that talks to the daemon because it was given no device of its own: none of these
+/// options may be given. Throws UsageError.
+void refuseWithoutOwnDevice(const Arguments& arguments, std::span<const OptionEntry> options);
 
 /// Makes the device; a played one waits by the streams' clock. Throws Failure when a file cannot be
 /// read, or when there is no surface or it cannot be opened.

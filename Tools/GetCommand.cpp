@@ -1,12 +1,15 @@
 #include "Tools/GetCommand.h"
 
 #include "Platform/Json.h"
+#include "Tools/Daemon/DaemonClient.h"
+#include "Tools/Daemon/DaemonCommand.h"
 #include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
 #include "Tools/HostedDevice.h"
 #include "Tools/OptionValues.h"
 
 #include <array>
+#include <functional>
 #include <string>
 #include <utility>
 #include <vector>
@@ -15,6 +18,7 @@ namespace VexaTouch::Tools {
 namespace {
 
 constexpr std::string_view kAllKey = "ServicePluginDebug";
+constexpr std::string_view kRecordingKey = "Recording";
 
 constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "KEY",
@@ -26,23 +30,27 @@ constexpr std::array<PositionalEntry, 1> kPositionals = {{
      .repeatable = true},
 }};
 
-constexpr std::array<OptionEntry, 5> kOptions = {{
+constexpr std::array<OptionEntry, 7> kOptions = {{
     {.name = "--all", .help = "All that the service tells for diagnosis"},
     {.name = "--json", .help = "Print one JSON object with a member for each key"},
-    kDeviceOption,
+    kBusOption,
+    Daemon::kSurfaceOption,
+    kOwnDeviceOption,
     kMatchOption,
     kSeedOption,
 }};
 
 constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
     {kExitSuccess, "each key has a value"},
-    {kExitFailure, "a key has no value, or the plug-in or the device cannot be used"},
+    {kExitFailure,
+     "a key has no value, no daemon answers or it refuses, or the plug-in or the device cannot be "
+     "used"},
     {kExitUsage, "the command line is wrong"},
 }};
 
 constexpr std::array<ExampleEntry, 4> kExamples = {{
     {"vexatouch get Pipeline.Algs.HoldTimeoutMilliseconds", "Prints one value"},
-    {"vexatouch get --all", "Prints everything that the service tells"},
+    {"vexatouch get --all --device sim", "Prints everything that a service of its own tells"},
     {"vexatouch get Pipeline.Algs.EventStats --device recording:session.json@max",
      "Counts the gestures of a recording"},
     {"vexatouch get Recording --device sim:Examples/taps.gesture > taps.json",
@@ -50,25 +58,23 @@ constexpr std::array<ExampleEntry, 4> kExamples = {{
 }};
 
 constexpr std::string_view kDescription =
-    "Starts the service on a device, asks it for properties and stops it again. With a script or a "
-    "recording it asks when everything was played, otherwise at once.\n"
+    "Asks the daemon for properties of its surface. What carries raw touches (Recording, "
+    "ServicePluginDebug, --all) takes root or the group vexatouch.\n"
+    "\n"
+    "With --device it needs no daemon: it starts the service on a device of its own, asks it and "
+    "stops it again. With a script or a recording it asks when everything was played, otherwise at "
+    "once.\n"
     "\n"
     "A single key's value stands alone, a string as it is: \"Recording\" comes out as the JSON "
     "document that it is. Of several keys each has a line, KEY: VALUE, the values as JSON.";
 
 /// One key and its value, in the order to be printed.
 using Properties = std::vector<std::pair<std::string, Vexa::PropertyValue>>;
+/// Gives the value of a key, or throws Failure.
+using Reader = std::function<Vexa::PropertyValue(const std::string& key)>;
 
-Vexa::PropertyValue propertyOf(const Host::HostSession& session, const std::string& key) {
-    Vexa::PropertyValue value = session.property(key);
-    if (!value) {
-        throw Failure(key + ": there is no such property, or it has no value");
-    }
-    return value;
-}
-
-Properties readAll(const Host::HostSession& session) {
-    const Vexa::PropertyValue all = propertyOf(session, std::string(kAllKey));
+Properties readAll(const Reader& read) {
+    const Vexa::PropertyValue all = read(std::string(kAllKey));
     const auto members = all.asDictionary();
     if (!members) {
         throw Failure(std::string(kAllKey) + ": the service answers with no dictionary");
@@ -80,11 +86,50 @@ Properties readAll(const Host::HostSession& session) {
     return properties;
 }
 
-Properties readKeys(const Host::HostSession& session, const std::vector<std::string>& keys) {
+Properties readKeys(const Reader& read, const std::vector<std::string>& keys, bool all) {
+    if (all) {
+        return readAll(read);
+    }
     Properties properties;
     for (const std::string& key : keys) {
-        properties.emplace_back(key, propertyOf(session, key));
+        properties.emplace_back(key, read(key));
     }
+    return properties;
+}
+
+Properties readFromDaemon(const Arguments& arguments, const std::vector<std::string>& keys,
+                          bool all) {
+    refuseWithoutOwnDevice(arguments, std::array{kSeedOption, kMatchOption});
+    Daemon::DaemonClient client(arguments.value(kBusOption.name));
+    const std::string path = client.choose(arguments);
+    const Reader read = [&](const std::string& key) {
+        return key == kRecordingKey ? Vexa::PropertyValue(client.recording(path))
+                                    : client.get(path, key);
+    };
+    return readKeys(read, keys, all);
+}
+
+Properties readFromOwnDevice(const Arguments& arguments, const std::vector<std::string>& keys,
+                             bool all, Streams& streams) {
+    const DeviceChoice choice = DeviceChoice::parse(arguments.value(kOwnDeviceOption.name));
+    DeviceWishes wishes{.announceSeed = false};
+    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.match = matchOption(arguments, choice);
+    HostedDevice hosted(
+        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
+    hosted.begin();
+    if (choice.ends()) {
+        hosted.waitUntilPlayed();
+    }
+    const Reader read = [&](const std::string& key) {
+        Vexa::PropertyValue value = hosted.session().property(key);
+        if (!value) {
+            throw Failure(key + ": there is no such property, or it has no value");
+        }
+        return value;
+    };
+    Properties properties = readKeys(read, keys, all);
+    hosted.end();
     return properties;
 }
 
@@ -121,19 +166,9 @@ int runGet(const Arguments& arguments, Streams& streams) {
     if (all != keys.empty()) {
         throw UsageError("get: expected either a KEY or --all");
     }
-    const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
-    DeviceWishes wishes{.announceSeed = false};
-    wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
-    wishes.match = matchOption(arguments, choice);
-    HostedDevice hosted(
-        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
-    hosted.begin();
-    if (choice.ends()) {
-        hosted.waitUntilPlayed();
-    }
-    const Properties properties =
-        all ? readAll(hosted.session()) : readKeys(hosted.session(), keys);
-    hosted.end();
+    const Properties properties = arguments.given(kOwnDeviceOption.name)
+                                      ? readFromOwnDevice(arguments, keys, all, streams)
+                                      : readFromDaemon(arguments, keys, all);
     if (arguments.given("--json")) {
         printJson(properties, streams);
     } else if (!all && properties.size() == 1) {

@@ -1,6 +1,9 @@
 #include "Tools/RecordCommand.h"
 
 #include "Host/PluginLibrary.h"
+#include "Tools/Daemon/DaemonClient.h"
+#include "Tools/Daemon/DaemonCommand.h"
+#include "Tools/Daemon/StreamedRecord.h"
 #include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
 #include "Tools/LogOptions.h"
@@ -24,15 +27,20 @@ constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "FILE", .help = "Where the recording goes; - writes to standard output"},
 }};
 
-constexpr std::array<OptionEntry, 11> kOptions = {{
-    kDeviceOption,
+constexpr OptionEntry kSetOption = {
+    .name = "--set",
+    .valueName = "KEY=VALUE",
+    .help = "Give the service a setting before it is scheduled; the value is JSON",
+    .repeatable = true,
+    .kind = ValueKind::Choice,
+    .choices = kSettingChoices};
+
+constexpr std::array<OptionEntry, 13> kOptions = {{
+    kBusOption,
+    Daemon::kSurfaceOption,
+    kOwnDeviceOption,
     kMatchOption,
-    {.name = "--set",
-     .valueName = "KEY=VALUE",
-     .help = "Give the service a setting before it is scheduled; the value is JSON",
-     .repeatable = true,
-     .kind = ValueKind::Choice,
-     .choices = kSettingChoices},
+    kSetOption,
     {.name = "--duration", .valueName = "TIME", .help = "End after a time: 10, 10s, 500ms, 2min"},
     {.name = "--count", .valueName = "N", .help = "End after so many input reports"},
     {.name = "--force", .help = "Replace FILE if it is there already and not empty"},
@@ -58,17 +66,20 @@ constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
 }};
 
 constexpr std::array<ExampleEntry, 4> kExamples = {{
-    {"vexatouch record session.json", "Records random gestures until Ctrl-C"},
+    {"vexatouch record session.json", "Records the daemon's surface until Ctrl-C"},
     {"vexatouch record night.json --duration 8h --sync 1s",
      "Records for long, and loses at most a second when the power fails"},
-    {"vexatouch record slow.json --set HoldTimeoutMilliseconds=900 --count 5000",
+    {"vexatouch record slow.json --device sim --set HoldTimeoutMilliseconds=900 --count 5000",
      "Records five thousand reports with a setting"},
     {"vexatouch record - --device sim:Examples/taps.gesture | vexatouch replay -",
      "Records a script and replays it"},
 }};
 
 constexpr std::string_view kDescription =
-    "Runs the service on a device and writes every input that it takes into FILE while it goes on: "
+    "Writes every input that the daemon's surface takes into FILE while it goes on, which takes "
+    "root "
+    "or the group vexatouch; with --device it needs no daemon and runs the service on a device of "
+    "its own. The file holds "
     "first a state frame for every setting in force, then the reports and changes of settings in "
     "the order in which the service took them, without a bound and in constant memory. Replaying "
     "the file gives the events that the service gave.\n"
@@ -114,11 +125,30 @@ int printSummary(const RecordingStream& stream, const RecordSummary& summary, St
     return kExitFailure;
 }
 
+int recordFromDaemon(const Arguments& arguments, Streams& streams) {
+    refuseWithoutOwnDevice(
+        arguments, std::array{kSetOption, kSeedOption, kRateOption, kEndlessOption, kMatchOption});
+    const Daemon::StreamedRecordOptions options{
+        .duration = durationOption(arguments, "--duration"),
+        .count = numberOption(arguments, "--count", 1, UINT64_MAX)};
+    const auto syncEvery = durationOption(arguments, "--sync");
+    const std::string file = arguments.value("FILE");
+    Daemon::DaemonClient client(arguments.value(kBusOption.name));
+    const FileDescriptor frames = client.recordStream(client.choose(arguments));
+    RecordingStream stream(openAppendTarget(file, arguments.given("--force"), streams),
+                           file == "-" ? "standard output" : file, syncEvery);
+    const RecordSummary summary = Daemon::recordStreamed(frames, options, stream);
+    return printSummary(stream, summary, streams);
+}
+
 int runRecord(const Arguments& arguments, Streams& streams) {
+    if (!arguments.given(kOwnDeviceOption.name)) {
+        return recordFromDaemon(arguments, streams);
+    }
     RecordRunOptions options = parseOptions(arguments);
     const auto syncEvery = durationOption(arguments, "--sync");
     const std::string file = arguments.value("FILE");
-    const DeviceChoice choice = DeviceChoice::parse(arguments.value(kDeviceOption.name));
+    const DeviceChoice choice = DeviceChoice::parse(arguments.value(kOwnDeviceOption.name));
     const DeviceWishes wishes = deviceWishes(arguments, choice);
     options.holdBack = choice.kind != DeviceChoice::Kind::Hidraw;
     const LogOptions logging(arguments.values(kLogOption.name));

@@ -1,6 +1,8 @@
 #include "Tools/SetCommand.h"
 
 #include "Platform/Json.h"
+#include "Tools/Daemon/DaemonClient.h"
+#include "Tools/Daemon/DaemonCommand.h"
 #include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
 #include "Tools/HostedDevice.h"
@@ -24,9 +26,11 @@ constexpr std::array<PositionalEntry, 2> kPositionals = {{
      .kind = ValueKind::Text},
 }};
 
-constexpr std::array<OptionEntry, 4> kOptions = {{
+constexpr std::array<OptionEntry, 6> kOptions = {{
     {.name = "--json", .help = "Print a JSON object with the key and its value"},
-    kDeviceOption,
+    kBusOption,
+    Daemon::kSurfaceOption,
+    kOwnDeviceOption,
     kMatchOption,
     kSeedOption,
 }};
@@ -34,19 +38,24 @@ constexpr std::array<OptionEntry, 4> kOptions = {{
 constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
     {kExitSuccess, "the value was taken"},
     {kExitFailure,
-     "nothing knows the key, the value was not taken, or the plug-in or the device cannot be used"},
+     "nothing knows the key, the value was not taken, no daemon answers or it refuses, or the "
+     "plug-in or the device cannot be used"},
     {kExitUsage, "the command line is wrong, or the value is no JSON"},
 }};
 
 constexpr std::array<ExampleEntry, 2> kExamples = {{
     {"vexatouch set Pipeline.Algs.HoldTimeoutMilliseconds 300", "Tries a setting"},
-    {"vexatouch set Product '\"My surface\"'", "Writes a property of the device"},
+    {"vexatouch set Product '\"My surface\"' --device sim", "Writes a property of the device"},
 }};
 
 constexpr std::string_view kDescription =
-    "Starts the service on a device, writes a property, prints what the property is then, and "
-    "stops "
-    "the service again; the value is gone with it.\n"
+    "Writes a property of the daemon's surface and prints what the property is then. It takes root "
+    "or the group vexatouch. A setting stays until the daemon ends, also when the surface is "
+    "unplugged and comes back.\n"
+    "\n"
+    "With --device it needs no daemon: it starts the service on a device of its own, writes the "
+    "property and stops the service again; the value is gone with it. The device then takes any "
+    "key, while the daemon takes only keys that exist.\n"
     "\n"
     "What is not in the domain \"Pipeline\" goes to the device, the service's own keys included: "
     "writing them changes nothing in the service. A property that can be written but not read, "
@@ -72,6 +81,30 @@ void checkKey(const std::string& key, const std::string& value) {
     }
 }
 
+Vexa::PropertyValue setAtDaemon(const Arguments& arguments, const std::string& key,
+                                const Vexa::PropertyValue& value) {
+    refuseWithoutOwnDevice(arguments, std::array{kSeedOption, kMatchOption});
+    Daemon::DaemonClient client(arguments.value(kBusOption.name));
+    return client.set(client.choose(arguments), key, value);
+}
+
+Vexa::PropertyValue setAtOwnDevice(const Arguments& arguments, const std::string& key,
+                                   const Vexa::PropertyValue& value, Streams& streams) {
+    const DeviceChoice choice = DeviceChoice::parse(arguments.value(kOwnDeviceOption.name));
+    DeviceWishes wishes{.announceSeed = false};
+    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.match = matchOption(arguments, choice);
+    HostedDevice hosted(
+        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
+    hosted.begin();
+    if (!hosted.session().setProperty(key, value)) {
+        throw Failure(key + ": the device did not take the value");
+    }
+    Vexa::PropertyValue now = hosted.session().property(key);
+    hosted.end();
+    return now;
+}
+
 int runSet(const Arguments& arguments, Streams& streams) {
     const std::string key = arguments.value("KEY");
     const std::string text = arguments.value("VALUE");
@@ -81,18 +114,9 @@ int runSet(const Arguments& arguments, Streams& streams) {
                          " (a string needs its quotes: '\"" + text + "\"')");
     }
     checkKey(key, text);
-    const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
-    DeviceWishes wishes{.announceSeed = false};
-    wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
-    wishes.match = matchOption(arguments, choice);
-    HostedDevice hosted(
-        makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
-    hosted.begin();
-    if (!hosted.session().setProperty(key, value)) {
-        throw Failure(key + ": the device did not take the value");
-    }
-    const Vexa::PropertyValue now = hosted.session().property(key);
-    hosted.end();
+    const Vexa::PropertyValue now = arguments.given(kOwnDeviceOption.name)
+                                        ? setAtOwnDevice(arguments, key, value, streams)
+                                        : setAtDaemon(arguments, key, value);
     if (arguments.given("--json")) {
         streams.out << Vexa::writeJson(Vexa::PropertyValue::Dictionary{{key, now}}) << '\n';
     } else if (now) {

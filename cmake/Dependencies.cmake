@@ -1,7 +1,8 @@
 # What is used from Debian (installed by script/bootstrap):
 #   HeaderOnlyBoost, HeaderOnlyCli, HeaderOnlySpdlog, HeaderOnlyFmt,
 #   HeaderOnlySystemd, HeaderOnlySdt              header-only, so they serve a cross build as well
-#   LibEvent, LibUdev, LibEvdev      to be linked, of the machine that is built for
+#   LibEvent, LibUdev, LibEvdev, LibSystemd
+#                                    to be linked, of the machine that is built for
 #   VexaGoogleTest                   gtest and gmock with their main
 #   rapidcheck, benchmark::benchmark_main
 find_package(Threads REQUIRED)
@@ -52,6 +53,7 @@ vexa_header_only(HeaderOnlyFmt fmt format.h)
 vexa_header_only(HeaderOnlySystemd systemd sd-journal.h)
 
 vexa_machine_library(LibEvent libevent_core-2.1.so.7 event2 event.h)
+vexa_machine_library(LibSystemd libsystemd.so.0 systemd sd-bus.h)
 vexa_machine_library(LibUdev libudev.so.1 libudev.h)
 vexa_machine_library(LibEvdev libevdev.so.2 libevdev-1.0 libevdev/libevdev.h)
 # Its headers include each other without the folder of the version.

@@ -84,8 +84,12 @@ vexa_device::vexa_device(std::shared_ptr<const Vexa::Library::Backend> backend) 
 // Nobody else has a reference, and the loop gets none any more.
 vexa_device::~vexa_device() {
     static_cast<void>(close(0));
-    const MutexLock lock(mutex_);
-    leaveLoop();
+    bool left = false;
+    {
+        const MutexLock lock(mutex_);
+        left = leaveLoop();
+    }
+    if (left) backend_->scheduled(nullptr, nullptr);
 }
 
 bool vexa_device::tryRetain() noexcept {
@@ -202,21 +206,30 @@ vexa_status vexa_device::setInputReportCallback(std::uint8_t* buffer, std::size_
 
 vexa_status vexa_device::schedule(vexa_run_loop* loop, const char* mode) noexcept {
     if (!loop || !mode) return VEXA_STATUS_BAD_ARGUMENT;
-    const MutexLock lock(mutex_);
-    if (loop->hasEnded() || (loop_ && !loop_->hasEnded())) return VEXA_STATUS_BAD_ARGUMENT;
-    leaveLoop();
-    mode_ = loop->mode(mode);
-    if (!mode_) return VEXA_STATUS_NO_RESOURCES;
-    loop->retain();
-    loop_ = loop;
-    if (watch()) return VEXA_STATUS_SUCCESS;
-    leaveLoop();
-    return VEXA_STATUS_NO_RESOURCES;
+    {
+        const MutexLock lock(mutex_);
+        if (loop->hasEnded() || (loop_ && !loop_->hasEnded())) return VEXA_STATUS_BAD_ARGUMENT;
+        static_cast<void>(leaveLoop());
+        mode_ = loop->mode(mode);
+        if (!mode_) return VEXA_STATUS_NO_RESOURCES;
+        loop->retain();
+        loop_ = loop;
+        if (!watch()) {
+            static_cast<void>(leaveLoop());
+            return VEXA_STATUS_NO_RESOURCES;
+        }
+    }
+    backend_->scheduled(loop, mode);
+    return VEXA_STATUS_SUCCESS;
 }
 
 void vexa_device::unschedule(vexa_run_loop* loop, const char* mode) noexcept {
-    const MutexLock lock(mutex_);
-    if (loop_ && loop_ == loop && mode_ == loop->mode(mode)) leaveLoop();
+    {
+        const MutexLock lock(mutex_);
+        if (!loop_ || loop_ != loop || mode_ != loop->mode(mode)) return;
+        static_cast<void>(leaveLoop());
+    }
+    backend_->scheduled(nullptr, nullptr);
 }
 
 // Reports are watched for while there is somewhere to take them from, to serve them, to put them,
@@ -232,11 +245,12 @@ void vexa_device::unwatch() noexcept {
     loop_->unwatch(*mode_, std::exchange(watch_, 0));
 }
 
-void vexa_device::leaveLoop() noexcept {
-    if (!loop_) return;
+bool vexa_device::leaveLoop() noexcept {
+    if (!loop_) return false;
     unwatch();
     mode_ = nullptr;
     std::exchange(loop_, nullptr)->release();
+    return true;
 }
 
 bool vexa_device::serve(std::uint64_t watch, bool isClosed) noexcept {

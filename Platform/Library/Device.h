@@ -61,7 +61,8 @@ private:
     void closeBackend(std::uint32_t options, Vexa::Library::FileDescriptor descriptor) noexcept;
     [[nodiscard]] bool watch() noexcept REQUIRES(mutex_);
     void unwatch() noexcept REQUIRES(mutex_);
-    void leaveLoop() noexcept REQUIRES(mutex_);
+    /// Whether there was one to leave.
+    bool leaveLoop() noexcept REQUIRES(mutex_);
     /// The report's length, or nothing when there is none; then it may be that the device has gone.
     std::optional<std::size_t> read(bool isClosed) noexcept REQUIRES(mutex_);
 

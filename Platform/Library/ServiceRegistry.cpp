@@ -52,6 +52,10 @@ void Backend::reportHandled() const noexcept {
     if (table_.report_handled) table_.report_handled(context_);
 }
 
+void Backend::scheduled(vexa_run_loop* loop, const char* mode) const noexcept {
+    if (table_.scheduled) table_.scheduled(context_, loop, mode);
+}
+
 namespace {
 
 class Registry {

@@ -29,6 +29,7 @@ public:
     void reportArrived(const std::uint8_t* report, std::size_t length,
                        std::uint64_t timestamp) const noexcept;
     void reportHandled() const noexcept;
+    void scheduled(vexa_run_loop* loop, const char* mode) const noexcept;
 
 private:
     vexa_device_backend table_{};

@@ -938,6 +938,60 @@ TEST(BareBackend, OfAnOlderHeaderHasNoNewerEntries) {
     ::close(ends[1]);
 }
 
+TEST(BareBackend, IsToldOfTheLoopThatServesIt) {
+    struct Heard {
+        int descriptor = -1;
+        std::vector<std::string> what;
+    };
+    Heard told;
+    vexa_device_backend table{};
+    table.size = sizeof table;
+    table.open = [](void* context, std::uint32_t, int* descriptor) -> vexa_status {
+        *descriptor = static_cast<Heard*>(context)->descriptor;
+        return VEXA_STATUS_SUCCESS;
+    };
+    table.report_arrived = [](void* context, const std::uint8_t* report, std::size_t length,
+                              std::uint64_t) {
+        static_cast<Heard*>(context)->what.push_back("arrived " +
+                                                     std::string(report, report + length));
+    };
+    table.scheduled = [](void* context, vexa_run_loop* loop, const char* mode) {
+        static_cast<Heard*>(context)->what.push_back(loop == vexa_run_loop_current()
+                                                         ? std::string("scheduled in ") + mode
+                                                     : loop == nullptr ? "left"
+                                                                       : "another loop");
+    };
+    const std::uint32_t service = vexa_service_register(&table, &told);
+    std::array<int, 2> ends{};
+    ASSERT_EQ(::socketpair(AF_UNIX, SOCK_SEQPACKET, 0, ends.data()), 0);
+    told.descriptor = ends[0];
+    {
+        const HidDevice device = HidDevice::create(service);
+        const RunLoop loop = RunLoop::current();
+        ASSERT_EQ(device.open(0), VEXA_STATUS_SUCCESS);
+        std::array<std::uint8_t, 4> buffer{};
+        device.setInputReportCallback(
+            buffer,
+            [](void* context, vexa_status, vexa_device*, vexa_report_type, std::uint32_t,
+               const std::uint8_t*, std::size_t,
+               std::uint64_t) { static_cast<Heard*>(context)->what.emplace_back("callback"); },
+            &told);
+        ASSERT_EQ(device.schedule(loop, "mode"), VEXA_STATUS_SUCCESS);
+        // Longer than the buffer: both get what is in there.
+        ASSERT_EQ(::send(ends[1], "report", 6, 0), 6);
+        EXPECT_EQ(loop.run("mode", VEXA_RUN_FOREVER, true), VEXA_RUN_HANDLED);
+        device.unschedule(loop, "another mode");
+        device.unschedule(loop, "mode");
+        device.unschedule(loop, "mode");
+        ASSERT_EQ(device.schedule(loop, "mode"), VEXA_STATUS_SUCCESS);
+        EXPECT_EQ(device.schedule(loop, "mode"), VEXA_STATUS_BAD_ARGUMENT);
+    }
+    ::close(ends[1]);
+    vexa_service_unregister(service);
+    EXPECT_EQ(told.what, (std::vector<std::string>{"scheduled in mode", "arrived repo", "callback",
+                                                   "left", "scheduled in mode", "left"}));
+}
+
 // Notes what it is told of reports, in order, with what the callback got in between.
 struct Told {
     struct Arrived {

@@ -8,6 +8,7 @@
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstdlib>
 #include <limits>
@@ -30,6 +31,10 @@ protected:
 
     static CommandResult get(std::vector<std::string> arguments) {
         arguments.insert(arguments.begin(), "get");
+        // Those of the daemon are tested with it.
+        if (std::ranges::find(arguments, "--device") == arguments.end()) {
+            arguments.insert(arguments.end(), {"--device", "sim"});
+        }
         return runCommand(arguments);
     }
     [[nodiscard]] std::string sessionAtOnce() const {

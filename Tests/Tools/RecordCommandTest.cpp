@@ -8,6 +8,7 @@
 
 #include <sys/wait.h>
 
+#include <algorithm>
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
@@ -45,6 +46,10 @@ protected:
 
     static CommandResult record(std::vector<std::string> arguments) {
         arguments.insert(arguments.begin(), "record");
+        // Those of the daemon are tested with it.
+        if (std::ranges::find(arguments, "--device") == arguments.end()) {
+            arguments.insert(arguments.end(), {"--device", "sim"});
+        }
         return runCommand(arguments);
     }
     /// A thousand images a second, forever.

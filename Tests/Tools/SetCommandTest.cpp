@@ -2,6 +2,7 @@
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
 #include <cstdlib>
 #include <string>
 #include <vector>
@@ -19,6 +20,10 @@ protected:
 
     static CommandResult set(std::vector<std::string> arguments) {
         arguments.insert(arguments.begin(), "set");
+        // Those of the daemon are tested with it.
+        if (std::ranges::find(arguments, "--device") == arguments.end()) {
+            arguments.insert(arguments.end(), {"--device", "sim"});
+        }
         return runCommand(arguments);
     }
 };

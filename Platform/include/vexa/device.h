@@ -61,6 +61,10 @@ typedef struct vexa_device_backend {
      * time; they are only good during the call. For each there is one `report_handled` later, on
      * the same thread. NULL: not told. Must not block. Since ABI 1.1. */
     void (*report_arrived)(void* context, const uint8_t* report, size_t length, uint64_t timestamp);
+    /* The device was scheduled on this loop and mode, so that a task that is submitted there runs
+     * between its reports; with NULL for both, it has left them. Called on the thread that did it.
+     * NULL: not told. Since ABI 1.1. */
+    void (*scheduled)(void* context, vexa_run_loop* loop, const char* mode);
 } vexa_device_backend;
 
 VEXA_BEGIN_C

@@ -1,0 +1,557 @@
+#include "Tools/Daemon/Daemon.h"
+
+#include "Shared/InputReport.h"
+#include "Tests/Daemon/DaemonUnderTest.h"
+#include "Tests/Tools/VexatouchProgram.h"
+#include "Tools/Daemon/BusNames.h"
+#include "Tools/Daemon/PropertyRules.h"
+#include "Tools/EventRecord.h"
+#include "Tools/Failure.h"
+#include "Tools/FrameFeed.h"
+
+#include <gmock/gmock.h>
+
+#include <fcntl.h>
+#include <grp.h>
+#include <sys/wait.h>
+
+#include <algorithm>
+#include <array>
+#include <chrono>
+#include <fstream>
+#include <future>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace VexaTouch::Testing {
+namespace {
+
+using ::testing::AllOf;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+using ::testing::SizeIs;
+using Tools::Failure;
+using Tools::FileDescriptor;
+using Tools::Daemon::Bus;
+using Tools::Daemon::BusError;
+using Tools::Daemon::BusMessage;
+using Tools::Daemon::DaemonClient;
+using Vexa::PropertyValue;
+namespace BusNames = Tools::Daemon::BusNames;
+
+constexpr const char* kHoldTimeout = "Pipeline.Algs.HoldTimeoutMilliseconds";
+/// In the example "taps".
+constexpr std::uint64_t kReportsOfTaps = 112;
+constexpr uid_t kStranger = 65534;
+
+std::string readToEnd(const FileDescriptor& file) {
+    std::string text;
+    std::array<char, 4096> piece{};
+    for (ssize_t got = 0; (got = ::read(file.get(), piece.data(), piece.size())) > 0;) {
+        text.append(piece.data(), static_cast<std::size_t>(got));
+    }
+    return text;
+}
+
+/// What a failing operation says; empty when it does not fail.
+template <typename Operation>
+std::string failureOf(Operation&& operation) {
+    try {
+        operation();
+    } catch (const Failure& error) {
+        return error.what();
+    }
+    return {};
+}
+
+class DaemonTest : public ::testing::Test {
+protected:
+    void SetUp() override {
+        if (!PrivateBus::isThere()) {
+            GTEST_SKIP() << PrivateBus::kProgram << " is missing: script/bootstrap installs it";
+        }
+        bus.emplace();
+        setenv("VEXATOUCH_PLUGIN", VEXATOUCH_PLUGIN_FILE, 1);
+    }
+    ~DaemonTest() override { unsetenv("VEXATOUCH_PLUGIN"); }
+
+    /// Starts the daemon with one surface, which is number 1, and waits until it runs.
+    void start(const std::string& device = example("taps"),
+               Tools::Daemon::RightsPolicy rights = DaemonUnderTest::rightsOfThisUser()) {
+        daemon.emplace(bus->address(), std::move(rights));
+        client.emplace(bus->address());
+        daemon->source.plug(playedSurface("7", device));
+        waitForState(1, "running");
+    }
+    void waitForState(unsigned number, const std::string& state) {
+        while (true) {
+            for (const auto& device : client->devices()) {
+                if (device.number == number &&
+                    device.properties.member("State").asString().value_or("") == state) {
+                    return;
+                }
+            }
+        }
+    }
+    /// Until the surface has sent so many reports.
+    void waitForReports(unsigned number, std::uint64_t reports) {
+        while (client->statistics(BusNames::devicePath(number)).member("Reports").toUnsigned64() <
+               reports) {
+        }
+    }
+
+    std::optional<PrivateBus> bus;
+    std::optional<DaemonUnderTest> daemon;
+    std::optional<DaemonClient> client;
+    const std::string first = BusNames::devicePath(1);
+};
+
+TEST_F(DaemonTest, GivesEachPropertyWithItsType) {
+    start();
+    waitForReports(1, kReportsOfTaps);
+    EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(500U));
+    const PropertyValue threshold = client->get(first, "Pipeline.Algs.ActivationThreshold");
+    EXPECT_EQ(threshold.type(), PropertyValue::Type::Float);
+    EXPECT_EQ(threshold, PropertyValue(200.0F));
+    EXPECT_EQ(client->get(first, "Pipeline.Algs.EnableTapSuppression"), PropertyValue(true));
+    EXPECT_EQ(client->get(first, "Version"), PropertyValue(PropertyValue::Array{13, 0, 0}));
+    EXPECT_EQ(client->get(first, "Pipeline.Algs.VirtualNormalizationFactors.22").type(),
+              PropertyValue::Type::Float);
+    EXPECT_EQ(client->get(first, "SerialNumber").type(), PropertyValue::Type::String);
+    const PropertyValue debug = client->get(first, "ServicePluginDebug");
+    EXPECT_EQ(debug.member("Recording"), PropertyValue(client->recording(first)));
+}
+
+TEST_F(DaemonTest, AKeyThatNothingKnowsIsRefusedByName) {
+    start();
+    for (const char* key :
+         {"", "Bogus", "Pipeline", "Pipeline.Bogus", "Pipeline.Algs.", "Pipeline.Algs.Bogus",
+          "Pipeline.Algs.ResetEventStats", "Pipeline.Algs.VirtualNormalizationFactors",
+          "Pipeline.Algs.VirtualNormalizationFactors.23",
+          "Pipeline.Algs.VirtualNormalizationFactors.-1",
+          "Pipeline.Algs.VirtualNormalizationFactors. 1",
+          "Pipeline.Algs.VirtualNormalizationFactors.01",
+          "Pipeline.Algs.VirtualNormalizationFactors.99999999999999999999999"}) {
+        EXPECT_THAT(failureOf([&] { static_cast<void>(client->get(first, key)); }),
+                    HasSubstr("(org.vexatouch.Touch1.Error.UnknownKey)"))
+            << key;
+    }
+    EXPECT_THAT(
+        failureOf([&] { static_cast<void>(client->get(first, std::string(1'000'000, 'k'))); }),
+        HasSubstr("UnknownKey"));
+}
+
+TEST_F(DaemonTest, ASettingIsTakenAndReadBack) {
+    start();
+    EXPECT_EQ(client->set(first, kHoldTimeout, 300), PropertyValue(300U));
+    EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(300U));
+    EXPECT_EQ(client->set(first, "Pipeline.Algs.ActivationThreshold", 150.5),
+              PropertyValue(150.5F));
+    EXPECT_EQ(client->set(first, "Pipeline.Algs.ResetEventStats", true).type(),
+              PropertyValue::Type::None);
+    EXPECT_EQ(client->set(first, "Product", "Mine"), PropertyValue("Mine"));
+}
+
+TEST_F(DaemonTest, WhatIsNoSettingIsNotTakenAndNotRecorded) {
+    start();
+    waitForReports(1, kReportsOfTaps);
+    const std::string before = client->recording(first);
+    struct Case {
+        std::string key;
+        PropertyValue value;
+        const char* error;
+    };
+    const std::vector<Case> cases = {
+        {kHoldTimeout, "soon", "InvalidValue"},
+        {kHoldTimeout, PropertyValue::null(), "InvalidValue"},
+        {kHoldTimeout, PropertyValue::Array{1}, "InvalidValue"},
+        {kHoldTimeout, PropertyValue(), "InvalidValue"},
+        {"Pipeline.Algs.EventStats", 1, "ReadOnly"},
+        {"Pipeline.DebugInfo", 1, "ReadOnly"},
+        {"Version", 1, "ReadOnly"},
+        {"Recording", "x", "ReadOnly"},
+        {"Pipeline.Algs.Bogus", 1, "UnknownKey"},
+        {"Pipeline.Algs.VirtualNormalizationFactors.1 ", 1, "UnknownKey"},
+        {"Colour", "grey", "UnknownKey"},
+        {"Product", std::string(20'000, 'x'), "InvalidValue"},
+        {std::string(200, 'k'), 1, "UnknownKey"},
+    };
+    for (const Case& each : cases) {
+        EXPECT_THAT(failureOf([&] { client->set(first, each.key, each.value); }),
+                    HasSubstr(std::string("(org.vexatouch.Touch1.Error.") + each.error))
+            << each.key;
+    }
+    EXPECT_EQ(client->recording(first), before);
+}
+
+TEST_F(DaemonTest, TheRecordingIsAFileThatNobodyCanChange) {
+    start();
+    waitForReports(1, kReportsOfTaps);
+    BusMessage reply = client->bus().ask(
+        client->bus().call(BusNames::kService, first, BusNames::kDevice, "GetRecording"));
+    const FileDescriptor file = reply.readDescriptor();
+    EXPECT_EQ(::fcntl(file.get(), F_GET_SEALS),
+              F_SEAL_SEAL | F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE);
+    EXPECT_EQ(::ftruncate(file.get(), 0), -1);
+    const std::string text = readToEnd(file);
+    EXPECT_THAT(text, HasSubstr("\"Frames\""));
+    EXPECT_EQ(text, client->recording(first));
+}
+
+TEST_F(DaemonTest, AStreamBeginsWithEverySettingAndHasEveryReport) {
+    start("sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture");
+    client->set(first, kHoldTimeout, 300);
+    const FileDescriptor frames = client->recordStream(first);
+    client->set(first, kHoldTimeout, 400);
+    const std::uint64_t sent = 78;
+    waitForReports(1, sent);
+    daemon->source.unplug("7");
+    std::vector<std::string> settings;
+    std::vector<std::uint32_t> frameNumbers;
+    std::optional<PropertyValue> firstTimeout;
+    std::optional<PropertyValue> lastTimeout;
+    Tools::FrameDecoder decoder(
+        {.onFrame =
+             [&](const RecordedFrame& frame) {
+                 if (frame.type == RecordedFrame::Type::InputReport) {
+                     const auto image =
+                         InputReport::Image::parse(frame.report.data(), frame.report.size());
+                     frameNumbers.push_back(image ? image->frameNumber : 0);
+                     return;
+                 }
+                 settings.push_back(frame.key);
+                 if (frame.key == "Algs.HoldTimeoutMilliseconds") {
+                     firstTimeout = firstTimeout.value_or(frame.value);
+                     lastTimeout = frame.value;
+                 }
+             },
+         .onGap = [](const Tools::FrameGap&) { ADD_FAILURE() << "frames were lost"; }});
+    const std::string bytes = readToEnd(frames);  // ends with the surface
+    decoder.write({reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size()});
+    EXPECT_TRUE(decoder.isBetweenFrames());
+    EXPECT_THAT(settings, SizeIs(4 + 23 + 1));
+    EXPECT_EQ(firstTimeout, PropertyValue(300));
+    EXPECT_EQ(lastTimeout, PropertyValue(400));
+    ASSERT_FALSE(frameNumbers.empty());
+    for (std::size_t i = 1; i < frameNumbers.size(); ++i) {
+        EXPECT_EQ(frameNumbers[i], frameNumbers[0] + i);
+    }
+}
+
+TEST_F(DaemonTest, AReaderThatIsTooSlowLosesFramesAndHoldsNobodyUp) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    daemon->source.plug(playedSurface("7", example("mixed")));
+    waitForState(1, "running");
+    const FileDescriptor frames = client->recordStream(first);
+    daemon->source.plug(playedSurface("8", "sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture"));
+    waitForState(2, "running");
+    // A reader that reads nothing costs one stream; the others answer.
+    EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(500U));
+    EXPECT_EQ(client->statistics(first).member("RecordStreams"), PropertyValue(1U));
+    // Whoever opens too many is told so.
+    std::vector<FileDescriptor> all;
+    std::string refused;
+    for (int i = 0; i < 16 && refused.empty(); ++i) {
+        refused = failureOf([&] { all.push_back(client->recordStream(first)); });
+    }
+    EXPECT_THAT(refused, HasSubstr("(org.vexatouch.Touch1.Error.Busy)"));
+    // And whoever leaves makes room.
+    all.clear();
+    while (client->statistics(first).member("RecordStreams").toUnsigned64() > 1) {
+    }
+    EXPECT_EQ(failureOf([&] { static_cast<void>(client->recordStream(first)); }), "");
+}
+
+TEST_F(DaemonTest, SignalsAreTheGesturesOfTheService) {
+    daemon.emplace(bus->address());
+    Tools::Daemon::EventLoop loop;
+    Bus watcher(bus->address());
+    std::vector<std::string> seen;
+    const std::vector<Tools::EventRecord> expected =
+        Tools::readExpectedEvents(VEXA_SOURCE_DIR "/Examples/holds.events");
+    const auto slot = watcher.match(
+        std::string("type='signal',interface='") + BusNames::kDevice + "',member='Gesture'",
+        [&](BusMessage signal) {
+            EXPECT_EQ(signal.path(), first);
+            std::string text = signal.readString();
+            for (int i = 0; i < 4; ++i) {
+                text += ' ' + std::to_string(signal.readNumber32());
+            }
+            const std::uint64_t event = signal.readNumber64();
+            EXPECT_GE(signal.readNumber64(), event);
+            seen.push_back(text);
+            if (seen.size() == expected.size()) {
+                loop.stop();
+            }
+        });
+    watcher.attach(loop, [&] { loop.stop(); });
+    daemon->source.plug(playedSurface("7", example("holds")));
+    loop.run();
+    std::vector<std::string> wanted;
+    for (const Tools::EventRecord& event : expected) {
+        wanted.push_back(std::string(Tools::eventKindName(event.kind)) + ' ' +
+                         std::to_string(event.region) + ' ' + std::to_string(event.phase) + ' ' +
+                         std::to_string(event.mask) + ' ' + std::to_string(event.frame));
+    }
+    EXPECT_EQ(seen, wanted);
+}
+
+TEST_F(DaemonTest, ASurfaceThatComesBackHasItsSettings) {
+    start();
+    client->set(first, kHoldTimeout, 300);
+    daemon->source.unplug("7");
+    while (!client->devices().empty()) {
+    }
+    EXPECT_THAT(failureOf([&] { static_cast<void>(client->get(first, kHoldTimeout)); }),
+                HasSubstr("UnknownObject"));
+    auto again = playedSurface("9", example("taps"));
+    again.serial = "serial 7";
+    daemon->source.plug(again);
+    waitForState(2, "running");
+    daemon->source.plug(playedSurface("10", example("taps")));
+    waitForState(3, "running");
+    EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(300U));
+    EXPECT_EQ(client->get(BusNames::devicePath(3), kHoldTimeout), PropertyValue(500U));
+    // What it had before they were set.
+    client->bus().ask(client->bus().call(BusNames::kService, BusNames::devicePath(2),
+                                         BusNames::kDevice, "Reset"));
+    EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(500U));
+    daemon->stop();
+    EXPECT_EQ(daemon->log(),
+              "surface 1, /dev/hidraw7, Surface 7: running\n"
+              "surface 1, /dev/hidraw7, Surface 7: unplugged\n"
+              "surface 2, /dev/hidraw9, Surface 9: running\n"
+              "surface 3, /dev/hidraw10, Surface 10: running\n");
+}
+
+TEST_F(DaemonTest, ASurfaceThatCannotBeOpenedSaysWhy) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    auto broken = playedSurface("7", example("taps"));
+    broken.open = []() -> std::shared_ptr<Vexa::DeviceBackend> {
+        throw Failure("/dev/hidraw7: no permission");
+    };
+    daemon->source.plug(broken);
+    waitForState(1, "failed");
+    EXPECT_EQ(client->devices().front().properties.member("Reason"),
+              PropertyValue("/dev/hidraw7: no permission"));
+    for (const char* key : {kHoldTimeout, "Recording"}) {
+        EXPECT_THAT(failureOf([&] { static_cast<void>(client->get(first, key)); }),
+                    AllOf(HasSubstr("no permission"), HasSubstr("NotRunning")));
+    }
+    EXPECT_THAT(failureOf([&] { static_cast<void>(client->recordStream(first)); }),
+                HasSubstr("NotRunning"));
+    EXPECT_EQ(client->statistics(first).member("Reports"), PropertyValue(0U));
+}
+
+TEST_F(DaemonTest, AFloodOfCallsIsAnsweredOrToldThatItIsTooMuch) {
+    start();
+    Tools::Daemon::EventLoop loop;
+    Bus flood(bus->address());
+    constexpr std::size_t kCalls = 2000;
+    std::size_t answers = 0;
+    std::size_t busy = 0;
+    std::vector<Tools::Daemon::BusSlot> slots;
+    const auto count = [&] {
+        if (++answers == kCalls) {
+            loop.stop();
+        }
+    };
+    for (std::size_t i = 0; i < kCalls; ++i) {
+        BusMessage call = flood.call(BusNames::kService, first, BusNames::kDevice, "Get");
+        call.string("ServicePluginDebug");
+        slots.push_back(flood.askLater(
+            call, [&](BusMessage) { count(); },
+            [&](const BusError& error) {
+                EXPECT_EQ(error.name(), Tools::Daemon::ErrorName::kBusy);
+                ++busy;
+                count();
+            }));
+    }
+    flood.attach(loop, [&] { loop.stop(); });
+    loop.run();
+    EXPECT_EQ(answers, kCalls);
+    EXPECT_GT(busy, 0U);
+    EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(500U));
+}
+
+TEST_F(DaemonTest, EveryInputThreadAnswersAPing) {
+    start();
+    daemon->source.plug(playedSurface("8", example("taps")));
+    waitForState(2, "running");
+    std::promise<void> answered;
+    daemon->call([&](Tools::Daemon::Daemon& under) { under.ping([&] { answered.set_value(); }); });
+    answered.get_future().get();
+    // Nobody to ask is no reason to be silent.
+    daemon->source.unplug("7");
+    daemon->source.unplug("8");
+    std::promise<void> again;
+    daemon->call([&](Tools::Daemon::Daemon& under) { under.ping([&] { again.set_value(); }); });
+    again.get_future().get();
+}
+
+TEST_F(DaemonTest, TheManagerTellsOfWhatComesAndGoes) {
+    daemon.emplace(bus->address());
+    Tools::Daemon::EventLoop loop;
+    Bus watcher(bus->address());
+    std::vector<std::string> seen;
+    const auto slot =
+        watcher.match(std::string("type='signal',interface='") + BusNames::kManager + '\'',
+                      [&](BusMessage signal) {
+                          seen.push_back(signal.member() + ' ' + signal.readObjectPath());
+                          if (seen.size() == 1) {
+                              daemon->source.unplug("7");
+                          } else {
+                              loop.stop();
+                          }
+                      });
+    watcher.attach(loop, [&] { loop.stop(); });
+    daemon->source.plug(playedSurface("7", example("taps")));
+    loop.run();
+    EXPECT_THAT(seen, ElementsAre("DeviceAdded " + first, "DeviceRemoved " + first));
+}
+
+TEST_F(DaemonTest, TheNameIsThereOnce) {
+    daemon.emplace(bus->address());
+    Tools::Daemon::EventLoop loop;
+    Bus second(bus->address());
+    EXPECT_THAT(failureOf([&] { second.requestName(BusNames::kService); }),
+                HasSubstr("another daemon runs on this bus"));
+}
+
+/// What stands between <interface name="NAME"> and its end.
+std::string interfaceOf(const std::string& xml, const std::string& name) {
+    const std::size_t begin = xml.find("<interface name=\"" + name + "\">");
+    const std::size_t end = xml.find("</interface>", begin);
+    return begin == std::string::npos ? "" : xml.substr(begin, end - begin);
+}
+
+TEST_F(DaemonTest, TheInstalledInterfacesAreThoseOfTheObjects) {
+    start();
+    const std::string installed = contentOf(VEXA_SOURCE_DIR "/data/dbus/org.vexatouch.Touch1.xml");
+    const auto introspect = [&](const std::string& path) {
+        return client->bus()
+            .ask(client->bus().call(BusNames::kService, path, "org.freedesktop.DBus.Introspectable",
+                                    "Introspect"))
+            .readString();
+    };
+    for (const auto& [path, name] :
+         {std::pair(std::string(BusNames::kManagerPath), std::string(BusNames::kManager)),
+          std::pair(first, std::string(BusNames::kDevice))}) {
+        const std::string real = interfaceOf(introspect(path), name);
+        EXPECT_FALSE(real.empty());
+        EXPECT_EQ(interfaceOf(installed, name), real);
+    }
+}
+
+// ---- as other users, through the program ----
+
+struct Ran {
+    int exitCode = -1;
+    std::string output;
+};
+
+/// Runs the program as this user with these supplementary groups.
+Ran runAs(uid_t user, const std::vector<gid_t>& groups, std::vector<std::string> arguments) {
+    int ends[2];
+    if (pipe(ends) != 0) {
+        return {};
+    }
+    std::vector<char*> pointers = {const_cast<char*>(vexatouchProgram())};
+    for (std::string& argument : arguments) {
+        pointers.push_back(argument.data());
+    }
+    pointers.push_back(nullptr);
+    const pid_t child = fork();
+    if (child == 0) {
+        dup2(ends[1], STDOUT_FILENO);
+        dup2(ends[1], STDERR_FILENO);
+        if (setgroups(groups.size(), groups.data()) != 0 || setresgid(user, user, user) != 0 ||
+            setresuid(user, user, user) != 0) {
+            _exit(126);
+        }
+        execv(vexatouchProgram(), pointers.data());
+        _exit(127);
+    }
+    close(ends[1]);
+    Ran ran;
+    ran.output = readToEnd(FileDescriptor(ends[0]));
+    int status = 0;
+    waitpid(child, &status, 0);
+    ran.exitCode = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+    return ran;
+}
+
+class DaemonAccessTest : public DaemonTest {
+protected:
+    static constexpr gid_t kGroup = 54321;
+
+    void SetUp() override {
+        DaemonTest::SetUp();
+        if (geteuid() != 0) {
+            GTEST_SKIP() << "only root can become another user";
+        }
+        auto rights = DaemonUnderTest::rightsOfThisUser();
+        rights.group = kGroup;
+        rights.isOnSeat = [this](uid_t) { return onSeat.load(); };
+        if (bus) {
+            start(example("taps"), rights);
+        }
+    }
+    Ran run(std::vector<std::string> arguments, const std::vector<gid_t>& groups = {}) const {
+        arguments.insert(arguments.end(), {"--bus", bus->address()});
+        return runAs(kStranger, groups, std::move(arguments));
+    }
+
+    std::atomic<bool> onSeat = true;
+};
+
+TEST_F(DaemonAccessTest, WhoIsOnASeatMayWatchAndNothingElse) {
+    EXPECT_EQ(run({"get", kHoldTimeout}).output, "500\n");
+    EXPECT_EQ(run({"stats"}).exitCode, 0);
+    const std::vector<std::vector<std::string>> refused = {
+        {"set", kHoldTimeout, "300"},
+        {"set", "Pipeline.Algs.ResetEventStats", "true"},
+        {"get", "Recording"},
+        {"get", "ServicePluginDebug"},
+        {"get", "--all"},
+        {"record", "/dev/null", "--force"},
+    };
+    for (const auto& arguments : refused) {
+        const Ran ran = run(arguments);
+        EXPECT_EQ(ran.exitCode, 1) << arguments[0];
+        EXPECT_THAT(ran.output, HasSubstr("(org.freedesktop.DBus.Error.AccessDenied)"))
+            << arguments[1];
+        EXPECT_THAT(ran.output, HasSubstr("root or the group vexatouch"));
+    }
+    EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(500U));
+}
+
+TEST_F(DaemonAccessTest, WhoIsOnNoSeatMayNotEvenWatch) {
+    onSeat = false;
+    for (const auto& arguments :
+         std::vector<std::vector<std::string>>{{"stats"}, {"get", kHoldTimeout}, {"monitor"}}) {
+        const Ran ran = run(arguments);
+        EXPECT_EQ(ran.exitCode, 1);
+        EXPECT_THAT(ran.output, HasSubstr("a user on a seat, root or the group vexatouch"));
+    }
+}
+
+TEST_F(DaemonAccessTest, MembersOfTheGroupMayDoEverything) {
+    onSeat = false;
+    EXPECT_EQ(run({"set", kHoldTimeout, "300"}, {1, kGroup, 2}).output,
+              std::string(kHoldTimeout) + ": 300\n");
+    EXPECT_THAT(run({"get", "Recording"}, {kGroup}).output, HasSubstr("\"Frames\""));
+    EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(300U));
+}
+
+TEST_F(DaemonAccessTest, RootMayDoEverything) {
+    const Ran ran = runAs(0, {}, {"set", kHoldTimeout, "300", "--bus", bus->address()});
+    EXPECT_EQ(ran.output, std::string(kHoldTimeout) + ": 300\n");
+}
+
+}  // namespace
+}  // namespace VexaTouch::Testing

@@ -1,0 +1,148 @@
+#pragma once
+
+#include "Host/PluginLibrary.h"
+#include "Tests/Daemon/PrivateBus.h"
+#include "Tools/Daemon/Bus.h"
+#include "Tools/Daemon/Daemon.h"
+#include "Tools/Daemon/DaemonClient.h"
+#include "Tools/Daemon/DeviceSource.h"
+#include "Tools/Daemon/EventLoop.h"
+#include "Tools/DeviceChoice.h"
+#include "Tools/FileDescriptor.h"
+
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <cstdint>
+#include <functional>
+#include <future>
+#include <iostream>
+#include <memory>
+#include <mutex>
+#include <sstream>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+namespace VexaTouch::Testing {
+
+/// Surfaces that a test plugs in and out. Any thread.
+class PluggedByHand final : public Tools::Daemon::DeviceSource {
+public:
+    PluggedByHand() : event_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
+
+    void plug(Tools::Daemon::PluggedSurface surface) {
+        put({.added = true, .surface = std::move(surface)});
+    }
+    void unplug(const std::string& id) {
+        Tools::Daemon::PlugChange change{.added = false, .surface = {}};
+        change.surface.id = id;
+        put(std::move(change));
+    }
+
+    [[nodiscard]] int descriptor() const noexcept override { return event_.get(); }
+    [[nodiscard]] std::vector<Tools::Daemon::PlugChange> takeChanges() override {
+        std::uint64_t count = 0;
+        static_cast<void>(::read(event_.get(), &count, sizeof count) == sizeof count);
+        const std::lock_guard guard(lock_);
+        return std::exchange(changes_, {});
+    }
+
+private:
+    void put(Tools::Daemon::PlugChange change) {
+        const std::lock_guard guard(lock_);
+        changes_.push_back(std::move(change));
+        const std::uint64_t one = 1;
+        static_cast<void>(::write(event_.get(), &one, sizeof one) == sizeof one);
+    }
+
+    Tools::FileDescriptor event_;
+    std::mutex lock_;
+    std::vector<Tools::Daemon::PlugChange> changes_;
+};
+
+/// A surface that plays what --device names.
+inline Tools::Daemon::PluggedSurface playedSurface(const std::string& id, const std::string& device,
+                                                   bool endless = false) {
+    Tools::Daemon::PluggedSurface surface;
+    surface.id = id;
+    surface.name = "Surface " + id;
+    surface.node = "/dev/hidraw" + id;
+    surface.serial = "serial " + id;
+    surface.physicalPath = "usb-" + id;
+    surface.vendor = 0x5658;
+    surface.product = 0x5454;
+    surface.open = [device, endless] {
+        Tools::Streams streams{.in = std::cin, .out = std::cout, .error = std::cerr};
+        Tools::DeviceWishes wishes{.announceSeed = false};
+        wishes.endless = endless;
+        return Tools::makeDevice(Tools::DeviceChoice::parse(device), wishes, streams);
+    };
+    return surface;
+}
+
+inline std::string example(const std::string& name) {
+    return "recording:" VEXA_SOURCE_DIR "/Examples/" + name + ".json@max";
+}
+
+/// The daemon on a thread of this process, and its source.
+class DaemonUnderTest {
+public:
+    explicit DaemonUnderTest(const std::string& bus,
+                             Tools::Daemon::RightsPolicy rights = rightsOfThisUser())
+        : library_(VEXATOUCH_PLUGIN_FILE) {
+        std::promise<void> ready;
+        thread_ = std::thread([this, bus, rights, &ready] { serve(bus, rights, ready); });
+        ready.get_future().get();
+    }
+    ~DaemonUnderTest() { stop(); }
+    DaemonUnderTest(const DaemonUnderTest&) = delete;
+    DaemonUnderTest& operator=(const DaemonUnderTest&) = delete;
+
+    void stop() {
+        if (thread_.joinable()) {
+            loop_.post([this] { daemon_->end([this] { loop_.stop(); }); });
+            thread_.join();
+        }
+    }
+    /// Calls on the daemon's thread and waits.
+    void call(const std::function<void(Tools::Daemon::Daemon& daemon)>& what) {
+        std::promise<void> done;
+        loop_.post([&] {
+            what(*daemon_);
+            done.set_value();
+        });
+        done.get_future().get();
+    }
+
+    PluggedByHand source;
+
+    static Tools::Daemon::RightsPolicy rightsOfThisUser() {
+        Tools::Daemon::RightsPolicy rights;
+        rights.ownUser = geteuid();
+        return rights;
+    }
+
+    /// All that was logged; once stopped.
+    [[nodiscard]] std::string log() const { return log_.str(); }
+
+private:
+    void serve(const std::string& address, const Tools::Daemon::RightsPolicy& rights,
+               std::promise<void>& ready) {
+        Tools::Daemon::Bus bus(address);
+        bus.attach(loop_, [this] { loop_.stop(); });
+        Tools::Daemon::Daemon daemon(loop_, bus, library_, source, {.rights = rights}, log_);
+        daemon_ = &daemon;
+        ready.set_value();
+        loop_.run();
+    }
+
+    Host::PluginLibrary library_;
+    Tools::Daemon::EventLoop loop_;
+    Tools::Daemon::Daemon* daemon_ = nullptr;
+    std::ostringstream log_;
+    std::thread thread_;
+};
+
+}  // namespace VexaTouch::Testing

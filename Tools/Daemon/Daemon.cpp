@@ -1,0 +1,217 @@
+#include "Tools/Daemon/Daemon.h"
+
+#include "Tools/Daemon/BusNames.h"
+
+#include <sys/epoll.h>
+
+#include <algorithm>
+#include <utility>
+
+namespace VexaTouch::Tools::Daemon {
+
+struct Daemon::Device {
+    unsigned number = 0;
+    bool plugged = true;
+    std::unique_ptr<EventListener> listener;
+    std::unique_ptr<SurfaceInstance> instance;
+    std::unique_ptr<DeviceObject> object;
+
+    [[nodiscard]] std::string title() const {
+        const PluggedSurface& surface = instance->surface();
+        std::string text = "surface " + std::to_string(number);
+        text += surface.node.empty() ? "" : ", " + surface.node;
+        text += surface.name.empty() ? "" : ", " + surface.name;
+        return text;
+    }
+};
+
+Daemon::Daemon(EventLoop& loop, Bus& bus, const Host::PluginLibrary& library, DeviceSource& source,
+               DaemonOptions options, std::ostream& log)
+    : loop_(loop),
+      bus_(bus),
+      library_(library),
+      source_(source),
+      options_(std::move(options)),
+      log_(log),
+      rights_(bus, options_.rights),
+      streams_(loop),
+      manager_(bus, rights_, [this] { return paths(); }) {
+    takeChanges();
+    // Who sees the name finds everything that was there at start.
+    bus_.requestName(BusNames::kService);
+    if (source_.descriptor() >= 0) {
+        sourceWatch_ =
+            loop_.watch(source_.descriptor(), EPOLLIN, [this](std::uint32_t) { takeChanges(); });
+    }
+}
+
+Daemon::~Daemon() = default;
+
+void Daemon::takeChanges() {
+    for (PlugChange& change : source_.takeChanges()) {
+        if (change.added) {
+            add(std::move(change.surface));
+        } else {
+            remove(change.surface.id);
+        }
+    }
+}
+
+void Daemon::add(PluggedSurface surface) {
+    Settings settings;
+    if (const auto found = remembered_.find(surface.key()); found != remembered_.end()) {
+        settings = found->second;
+    }
+    Device& device = *devices_.emplace_back(std::make_unique<Device>());
+    device.number = ++lastNumber_;
+    device.listener = options_.listener ? options_.listener() : nullptr;
+    SurfaceInstance::Hooks hooks;
+    hooks.onState = [this, &device] { stateChanged(device); };
+    hooks.onGestures = [&device](const Gestures& gestures) {
+        device.object->announceGestures(gestures);
+    };
+    if (device.listener) {
+        hooks.onEvent = [&listener = *device.listener](const Vexa::HidEvent& event) {
+            listener.handle(event);
+        };
+    }
+    device.instance = std::make_unique<SurfaceInstance>(loop_, library_, std::move(surface),
+                                                        std::move(settings), std::move(hooks));
+    device.object = std::make_unique<DeviceObject>(bus_, rights_, streams_, *device.instance,
+                                                   BusNames::devicePath(device.number));
+    manager_.announceAdded(device.object->path());
+    if (onChange) {
+        onChange();
+    }
+}
+
+void Daemon::stateChanged(Device& device) {
+    switch (device.instance->state()) {
+        case SurfaceInstance::State::Running:
+            log_ << device.title() << ": running" << std::endl;
+            break;
+        case SurfaceInstance::State::Failed:
+            log_ << device.title() << ": " << device.instance->reason() << std::endl;
+            break;
+        case SurfaceInstance::State::Starting:
+        case SurfaceInstance::State::Ending:
+            break;
+    }
+    if (device.object) {
+        device.object->announceState();
+    }
+    if (onChange) {
+        onChange();
+    }
+}
+
+void Daemon::remove(const std::string& id) {
+    const auto found = std::ranges::find_if(devices_, [&](const auto& device) {
+        return device->plugged && device->instance->surface().id == id;
+    });
+    if (found != devices_.end()) {
+        log_ << (*found)->title() << ": unplugged" << std::endl;
+        takeDown(**found);
+    }
+}
+
+void Daemon::takeDown(Device& device) {
+    device.plugged = false;
+    manager_.announceRemoved(device.object->path());
+    device.object->withdraw();
+    remember(device.instance->surface().key(), device.instance->settings());
+    device.instance->end([this, &device] { taken(device); });
+}
+
+void Daemon::taken(Device& device) {
+    const ReportCounts counts = device.instance->counts();
+    reportsOfGone_ += counts.reports;
+    if (counts.gaps > 0) {
+        log_ << device.title() << ": " << counts.framesLost << " of "
+             << counts.images + counts.framesLost << " frames were lost at " << counts.gaps
+             << " place(s)" << std::endl;
+    }
+    if (device.listener) {
+        device.listener->surfaceGone();
+    }
+    std::erase_if(devices_, [&](const auto& each) { return each.get() == &device; });
+    if (onChange) {
+        onChange();
+    }
+    if (devices_.empty() && ended_) {
+        std::exchange(ended_, nullptr)();
+    }
+}
+
+void Daemon::remember(const std::string& key, Settings settings) {
+    if (remembered_.contains(key)) {
+        std::erase(oldest_, key);
+    }
+    if (settings.empty()) {
+        remembered_.erase(key);
+        return;
+    }
+    remembered_.insert_or_assign(key, std::move(settings));
+    oldest_.push_back(key);
+    if (oldest_.size() > kMostRemembered) {
+        remembered_.erase(oldest_.front());
+        oldest_.pop_front();
+    }
+}
+
+void Daemon::end(std::function<void()> done) {
+    sourceWatch_.reset();
+    if (devices_.empty()) {
+        done();
+        return;
+    }
+    ended_ = std::move(done);
+    for (const auto& device : devices_) {
+        if (device->plugged) {
+            takeDown(*device);
+        }
+    }
+}
+
+void Daemon::ping(std::function<void()> answered) {
+    struct Round {
+        std::function<void()> answered;
+        std::size_t missing = 1;
+        void arrive() {
+            if (--missing == 0) {
+                answered();
+            }
+        }
+    };
+    const auto round = std::make_shared<Round>(Round{.answered = std::move(answered)});
+    for (const auto& device : devices_) {
+        ++round->missing;
+        device->instance->ping([round] { round->arrive(); });
+    }
+    round->arrive();
+}
+
+std::size_t Daemon::surfaces() const noexcept {
+    return static_cast<std::size_t>(
+        std::ranges::count_if(devices_, [](const auto& device) { return device->plugged; }));
+}
+
+std::uint64_t Daemon::reports() const noexcept {
+    std::uint64_t reports = reportsOfGone_;
+    for (const auto& device : devices_) {
+        reports += device->instance->counts().reports;
+    }
+    return reports;
+}
+
+std::vector<std::string> Daemon::paths() const {
+    std::vector<std::string> all;
+    for (const auto& device : devices_) {
+        if (device->plugged) {
+            all.push_back(device->object->path());
+        }
+    }
+    return all;
+}
+
+}  // namespace VexaTouch::Tools::Daemon

@@ -1,0 +1,107 @@
+#pragma once
+
+#include "Host/PluginLibrary.h"
+#include "Platform/HidEvent.h"
+#include "Tools/Daemon/Bus.h"
+#include "Tools/Daemon/CallerRights.h"
+#include "Tools/Daemon/DeviceObject.h"
+#include "Tools/Daemon/DeviceSource.h"
+#include "Tools/Daemon/EventLoop.h"
+#include "Tools/Daemon/ManagerObject.h"
+#include "Tools/Daemon/RecordStreams.h"
+#include "Tools/Daemon/SurfaceInstance.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <functional>
+#include <map>
+#include <memory>
+#include <ostream>
+#include <string>
+#include <vector>
+
+namespace VexaTouch::Tools::Daemon {
+
+/// Who else wants to know of the events of a surface, from its begin to its end.
+class EventListener {
+public:
+    EventListener() = default;
+    virtual ~EventListener() = default;
+    EventListener(const EventListener&) = delete;
+    EventListener(EventListener&&) = delete;
+    EventListener& operator=(const EventListener&) = delete;
+    EventListener& operator=(EventListener&&) = delete;
+
+    /// On the host's queue of this surface; must not throw.
+    virtual void handle(const Vexa::HidEvent& event) noexcept = 0;
+    /// No event comes any more. On the loop's thread.
+    virtual void surfaceGone() noexcept = 0;
+};
+
+struct DaemonOptions {
+    RightsPolicy rights;
+    /// Makes the listener of a surface; may be empty, or give none.
+    std::function<std::unique_ptr<EventListener>()> listener = {};
+};
+
+/// All surfaces of a source, each with its instance of the plug-in and its object on the bus. What
+/// was set on one stays in force when it is plugged in again. One thread, the loop's.
+class Daemon {
+public:
+    /// Devices that are gone and whose settings are remembered.
+    static constexpr std::size_t kMostRemembered = 64;
+
+    /// Outcomes are written to `log`, each once. Everything given must outlive it. Offers the
+    /// objects and asks for the name. Throws Failure.
+    Daemon(EventLoop& loop, Bus& bus, const Host::PluginLibrary& library, DeviceSource& source,
+           DaemonOptions options, std::ostream& log);
+    ~Daemon();
+    Daemon(const Daemon&) = delete;
+    Daemon(Daemon&&) = delete;
+    Daemon& operator=(const Daemon&) = delete;
+    Daemon& operator=(Daemon&&) = delete;
+
+    /// Takes down every surface, and calls back.
+    void end(std::function<void()> done);
+
+    /// Calls back once each input thread has answered.
+    void ping(std::function<void()> answered);
+
+    /// Surfaces that are plugged in, and reports that all of them have sent so far.
+    [[nodiscard]] std::size_t surfaces() const noexcept;
+    [[nodiscard]] std::uint64_t reports() const noexcept;
+    /// Called when either of both has changed by a plug or its state.
+    std::function<void()> onChange;
+
+private:
+    struct Device;
+
+    void takeChanges();
+    void add(PluggedSurface surface);
+    void remove(const std::string& id);
+    void takeDown(Device& device);
+    void taken(Device& device);
+    void stateChanged(Device& device);
+    void remember(const std::string& key, Settings settings);
+    [[nodiscard]] std::vector<std::string> paths() const;
+
+    EventLoop& loop_;
+    Bus& bus_;
+    const Host::PluginLibrary& library_;
+    DeviceSource& source_;
+    DaemonOptions options_;
+    std::ostream& log_;
+    CallerRights rights_;
+    RecordStreams streams_;
+    std::vector<std::unique_ptr<Device>> devices_;
+    unsigned lastNumber_ = 0;
+    std::uint64_t reportsOfGone_ = 0;
+    std::map<std::string, Settings> remembered_;
+    std::deque<std::string> oldest_;
+    std::function<void()> ended_;
+    ManagerObject manager_;
+    EventLoop::WatchHandle sourceWatch_;
+};
+
+}  // namespace VexaTouch::Tools::Daemon

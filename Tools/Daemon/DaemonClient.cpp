@@ -1,0 +1,150 @@
+#include "Tools/Daemon/DaemonClient.h"
+
+#include "Tools/Daemon/BusNames.h"
+#include "Tools/Failure.h"
+#include "Tools/OptionValues.h"
+
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <charconv>
+#include <cstring>
+#include <utility>
+
+namespace VexaTouch::Tools::Daemon {
+namespace {
+
+constexpr const char* kProperties = "org.freedesktop.DBus.Properties";
+
+bool isNobodyThere(const std::string& name) {
+    return name == "org.freedesktop.DBus.Error.ServiceUnknown" ||
+           name == "org.freedesktop.DBus.Error.NameHasNoOwner";
+}
+
+std::string readAll(const FileDescriptor& file) {
+    std::string text;
+    std::array<char, 65'536> piece{};
+    while (true) {
+        const ssize_t got = ::read(file.get(), piece.data(), piece.size());
+        if (got > 0) {
+            text.append(piece.data(), static_cast<std::size_t>(got));
+        } else if (got == 0) {
+            return text;
+        } else if (errno != EINTR) {
+            throw Failure(std::string("the recording cannot be read: ") + std::strerror(errno));
+        }
+    }
+}
+
+unsigned numberOf(const std::string& path) {
+    const std::size_t slash = path.rfind('/');
+    unsigned number = 0;
+    std::from_chars(path.data() + slash + 1, path.data() + path.size(), number);
+    return number;
+}
+
+}  // namespace
+
+DaemonClient::DaemonClient(const std::string& bus) try : where_(bus), bus_(bus) {
+} catch (const Failure& error) {
+    throw Failure(std::string("no daemon: ") + error.what() +
+                  " (with --device sim the command has a device of its own)");
+}
+
+BusMessage DaemonClient::ask(const BusMessage& call, const std::string& what) {
+    try {
+        return bus_.ask(call);
+    } catch (const BusError& error) {
+        if (isNobodyThere(error.name())) {
+            throw Failure("no daemon runs on the bus \"" + where_ +
+                          "\": start it with systemctl start vexatouch or vexatouch daemon, or "
+                          "give the command a device of its own with --device sim");
+        }
+        throw Failure((what.empty() ? "" : what + ": ") + error.what() + " (" + error.name() + ')');
+    }
+}
+
+BusMessage DaemonClient::deviceCall(const std::string& path, const char* member) const {
+    return bus_.call(BusNames::kService, path, BusNames::kDevice, member);
+}
+
+std::string DaemonClient::owner() {
+    constexpr const char* kBus = "org.freedesktop.DBus";
+    BusMessage call = bus_.call(kBus, "/org/freedesktop/DBus", kBus, "GetNameOwner");
+    call.string(BusNames::kService);
+    return ask(call, "").readString();
+}
+
+std::vector<DaemonClient::Device> DaemonClient::devices() {
+    BusMessage reply = ask(
+        bus_.call(BusNames::kService, BusNames::kManagerPath, BusNames::kManager, "ListDevices"),
+        "");
+    std::vector<Device> devices;
+    reply.enter('a', "o");
+    while (!reply.atEnd()) {
+        Device device;
+        device.path = reply.readObjectPath();
+        device.number = numberOf(device.path);
+        devices.push_back(std::move(device));
+    }
+    for (Device& device : devices) {
+        BusMessage call = bus_.call(BusNames::kService, device.path, kProperties, "GetAll");
+        call.string(BusNames::kDevice);
+        device.properties = ask(call, device.path).readDictionary();
+    }
+    std::ranges::sort(devices, {}, &Device::number);
+    return devices;
+}
+
+std::string DaemonClient::choose(const Arguments& arguments) {
+    const auto wanted = numberOption(arguments, kSurfaceOption.name, 1, UINT32_MAX);
+    if (wanted) {
+        return BusNames::devicePath(static_cast<unsigned>(*wanted));
+    }
+    const std::vector<Device> all = devices();
+    if (all.size() == 1) {
+        return all.front().path;
+    }
+    if (all.empty()) {
+        throw Failure("no surface is plugged in (the daemon runs and waits for one)");
+    }
+    std::string text = "there is more than one surface; name one with --surface:";
+    for (const Device& device : all) {
+        text += ' ' + std::to_string(device.number);
+    }
+    throw Failure(text);
+}
+
+Vexa::PropertyValue DaemonClient::get(const std::string& path, const std::string& key) {
+    BusMessage call = deviceCall(path, "Get");
+    call.text(key);
+    return ask(call, "").readAnyValue();
+}
+
+Vexa::PropertyValue DaemonClient::set(const std::string& path, const std::string& key,
+                                      const Vexa::PropertyValue& value) {
+    BusMessage call = deviceCall(path, "Set");
+    call.text(key);
+    try {
+        call.value(value);
+    } catch (const BusError& error) {
+        throw Failure(key + ": " + error.what() + " (" + error.name() + ')');
+    }
+    return ask(call, "").readAnyValue();
+}
+
+std::string DaemonClient::recording(const std::string& path) {
+    return readAll(ask(deviceCall(path, "GetRecording"), "").readDescriptor());
+}
+
+FileDescriptor DaemonClient::recordStream(const std::string& path) {
+    return ask(deviceCall(path, "RecordStream"), "").readDescriptor();
+}
+
+Vexa::PropertyValue DaemonClient::statistics(const std::string& path) {
+    return ask(deviceCall(path, "GetStatistics"), "").readDictionary();
+}
+
+}  // namespace VexaTouch::Tools::Daemon

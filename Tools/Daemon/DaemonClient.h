@@ -1,0 +1,61 @@
+#pragma once
+
+#include "Platform/PropertyValue.h"
+#include "Tools/CommandTable.h"
+#include "Tools/Daemon/Bus.h"
+#include "Tools/FileDescriptor.h"
+
+#include <string>
+#include <vector>
+
+namespace VexaTouch::Tools::Daemon {
+
+/// The command line's end of the daemon's interface. Each operation waits for the answer and throws
+/// Failure with what was asked for, what was wrong and the error's name. One thread.
+class DaemonClient {
+public:
+    struct Device {
+        unsigned number = 0;
+        std::string path;
+        Vexa::PropertyValue properties;  ///< of its interface, by name
+    };
+
+    /// Throws Failure when the bus or the daemon does not answer.
+    explicit DaemonClient(const std::string& bus);
+
+    /// The unique name of the daemon's connection, which its signals come from.
+    [[nodiscard]] std::string owner();
+    /// By number.
+    [[nodiscard]] std::vector<Device> devices();
+    /// The object of the surface that --surface names, or of the only one there is.
+    [[nodiscard]] std::string choose(const Arguments& arguments);
+
+    [[nodiscard]] Vexa::PropertyValue get(const std::string& path, const std::string& key);
+    /// Gives what the property is afterwards.
+    Vexa::PropertyValue set(const std::string& path, const std::string& key,
+                            const Vexa::PropertyValue& value);
+    /// The text of "Recording".
+    [[nodiscard]] std::string recording(const std::string& path);
+    /// Frames as FrameDecoder reads them, until the surface is gone.
+    [[nodiscard]] FileDescriptor recordStream(const std::string& path);
+    [[nodiscard]] Vexa::PropertyValue statistics(const std::string& path);
+
+    [[nodiscard]] Bus& bus() noexcept { return bus_; }
+
+private:
+    [[nodiscard]] BusMessage deviceCall(const std::string& path, const char* member) const;
+    BusMessage ask(const BusMessage& call, const std::string& what);
+
+    std::string where_;
+    Bus bus_;
+};
+
+/// Options of commands that talk to the daemon unless they are given a device of their own.
+inline constexpr OptionEntry kSurfaceOption = {
+    .name = "--surface",
+    .valueName = "N",
+    .help =
+        "The daemon's surface with this number (vexatouch stats lists them); not needed when "
+        "there is only one"};
+
+}  // namespace VexaTouch::Tools::Daemon

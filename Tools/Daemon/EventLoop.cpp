@@ -1,0 +1,189 @@
+#include "Tools/Daemon/EventLoop.h"
+
+#include "Tools/Failure.h"
+
+#include <pthread.h>
+#include <sys/epoll.h>
+#include <sys/eventfd.h>
+#include <sys/signalfd.h>
+#include <systemd/sd-event.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <csignal>
+#include <cstring>
+#include <exception>
+#include <optional>
+#include <string>
+#include <utility>
+
+namespace VexaTouch::Tools::Daemon {
+namespace {
+
+void check(int result) {
+    if (result < 0) {
+        throw Failure(std::string("no event loop: ") + std::strerror(-result));
+    }
+}
+
+}  // namespace
+
+class EventLoop::Watch {
+public:
+    explicit Watch(EventLoop& loop) noexcept : loop_(loop) {}
+    ~Watch() {
+        sd_event_source_disable_unref(source_);
+        if (previousMask) {
+            pthread_sigmask(SIG_SETMASK, &*previousMask, nullptr);
+        }
+    }
+    Watch(const Watch&) = delete;
+    Watch(Watch&&) = delete;
+    Watch& operator=(const Watch&) = delete;
+    Watch& operator=(Watch&&) = delete;
+
+    void watchDescriptor(int descriptor, std::uint32_t events) {
+        check(sd_event_add_io(loop_.get(), &source_, descriptor, events, &ready, this));
+    }
+    void watchClock(std::chrono::microseconds interval) {
+        interval_ = static_cast<std::uint64_t>(interval.count());
+        check(sd_event_add_time_relative(loop_.get(), &source_, CLOCK_MONOTONIC, interval_, 0,
+                                         &elapsed, this));
+        check(sd_event_source_set_enabled(source_, SD_EVENT_ON));
+    }
+
+    std::function<void(std::uint32_t events)> callback;
+    FileDescriptor own;
+    std::optional<sigset_t> previousMask;
+
+private:
+    // The callback may end the watch: it is kept until it has returned.
+    static int ready(sd_event_source* /*source*/, int /*descriptor*/, std::uint32_t events,
+                     void* context) {
+        Watch& self = *static_cast<Watch*>(context);
+        EventLoop& loop = self.loop_;
+        const auto kept = self.callback;
+        loop.guarded([&] { kept(events); });
+        return 0;
+    }
+    static int elapsed(sd_event_source* source, std::uint64_t /*due*/, void* context) {
+        Watch& self = *static_cast<Watch*>(context);
+        EventLoop& loop = self.loop_;
+        static_cast<void>(sd_event_source_set_time_relative(source, self.interval_));
+        const auto kept = self.callback;
+        loop.guarded([&] { kept(0); });
+        return 0;
+    }
+
+    EventLoop& loop_;
+    sd_event_source* source_ = nullptr;
+    std::uint64_t interval_ = 0;
+};
+
+void EventLoop::EndWatch::operator()(Watch* watch) const noexcept {
+    delete watch;
+}
+
+void EventLoop::Release::operator()(sd_event* event) const noexcept {
+    sd_event_unref(event);
+}
+
+EventLoop::EventLoop() {
+    sd_event* event = nullptr;
+    check(sd_event_new(&event));
+    event_.reset(event);
+    posted_ = FileDescriptor(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK));
+    check(posted_ ? 0 : -errno);
+    postedWatch_ = watch(posted_.get(), EPOLLIN, [this](std::uint32_t) { takePosted(); });
+}
+
+EventLoop::~EventLoop() = default;
+
+EventLoop::WatchHandle EventLoop::watch(int descriptor, std::uint32_t events,
+                                        std::function<void(std::uint32_t events)> callback) {
+    WatchHandle made(new Watch(*this));
+    made->callback = std::move(callback);
+    made->watchDescriptor(descriptor, events);
+    return made;
+}
+
+EventLoop::WatchHandle EventLoop::watchSignals(std::span<const int> signals,
+                                               std::function<void(int signal)> callback) {
+    sigset_t set{};
+    sigemptyset(&set);
+    for (const int signal : signals) {
+        sigaddset(&set, signal);
+    }
+    WatchHandle made(new Watch(*this));
+    made->own = FileDescriptor(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
+    check(made->own ? 0 : -errno);
+    sigset_t previous{};
+    pthread_sigmask(SIG_BLOCK, &set, &previous);
+    made->previousMask = previous;
+    const int descriptor = made->own.get();
+    made->callback = [descriptor, callback = std::move(callback)](std::uint32_t) {
+        signalfd_siginfo info{};
+        while (::read(descriptor, &info, sizeof info) == sizeof info) {
+            callback(static_cast<int>(info.ssi_signo));
+        }
+    };
+    made->watchDescriptor(descriptor, EPOLLIN);
+    return made;
+}
+
+EventLoop::WatchHandle EventLoop::every(std::chrono::microseconds interval,
+                                        std::function<void()> callback) {
+    WatchHandle made(new Watch(*this));
+    made->callback = [callback = std::move(callback)](std::uint32_t) { callback(); };
+    made->watchClock(interval);
+    return made;
+}
+
+void EventLoop::post(std::function<void()> callback) {
+    {
+        const Vexa::MutexLock guard(lock_);
+        callbacks_.push_back(std::move(callback));
+    }
+    const std::uint64_t one = 1;
+    // A counter that is full has woken already.
+    static_cast<void>(::write(posted_.get(), &one, sizeof one) == sizeof one);
+}
+
+void EventLoop::takePosted() {
+    std::uint64_t count = 0;
+    static_cast<void>(::read(posted_.get(), &count, sizeof count) == sizeof count);
+    std::deque<std::function<void()>> taken;
+    {
+        const Vexa::MutexLock guard(lock_);
+        taken.swap(callbacks_);
+    }
+    for (const auto& callback : taken) {
+        guarded(callback);
+    }
+}
+
+template <typename Callback>
+void EventLoop::guarded(Callback&& callback) noexcept {
+    try {
+        callback();
+    } catch (...) {
+        if (!failure_) {
+            failure_ = std::current_exception();
+        }
+        stop();
+    }
+}
+
+void EventLoop::run() {
+    const int result = sd_event_loop(event_.get());
+    if (failure_) {
+        std::rethrow_exception(std::exchange(failure_, nullptr));
+    }
+    check(result);
+}
+
+void EventLoop::stop() noexcept {
+    static_cast<void>(sd_event_exit(event_.get(), 0));
+}
+
+}  // namespace VexaTouch::Tools::Daemon

@@ -1,0 +1,26 @@
+#pragma once
+
+#include "Tools/FileDescriptor.h"
+#include "Tools/RecordRun.h"
+#include "Tools/RecordingStream.h"
+#include "Tools/Streams.h"
+
+#include <chrono>
+#include <cstdint>
+#include <optional>
+
+namespace VexaTouch::Tools::Daemon {
+
+/// When a streamed recording ends by itself.
+struct StreamedRecordOptions {
+    std::optional<std::chrono::nanoseconds> duration = {};
+    std::optional<std::uint64_t> count = {};  ///< of input reports
+};
+
+/// Writes the frames that come through a descriptor, as FrameDecoder reads them, until SIGINT,
+/// SIGTERM or SIGHUP, after a time or a number of reports, or when the far end is done, and
+/// finishes the recording. Throws Failure, also when the far end is done: the surface is gone then.
+RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
+                             RecordingStream& stream);
+
+}  // namespace VexaTouch::Tools::Daemon

@@ -1,0 +1,275 @@
+#include "Tools/Daemon/SurfaceInstance.h"
+
+#include "Platform/HostClock.h"
+#include "Shared/Util.h"
+#include "Tools/SettingKeys.h"
+
+#include <algorithm>
+#include <exception>
+#include <string_view>
+#include <utility>
+
+namespace VexaTouch::Tools::Daemon {
+namespace {
+
+constexpr const char* kWorkerLabel = "vexa-surface";
+constexpr std::string_view kPipelineDomain = "Pipeline.";
+
+bool isSetting(const std::string& key) {
+    if (!key.starts_with(kPipelineDomain)) {
+        return false;
+    }
+    const std::vector<std::string> keys = pipelineSettingKeys();
+    return std::ranges::find(keys, key.substr(kPipelineDomain.size())) != keys.end();
+}
+
+BusError notTaken(const std::string& key) {
+    return {ErrorName::kFailed, key + ": the device did not take the value"};
+}
+
+}  // namespace
+
+/// What lives on the worker, in the order in which it is made.
+struct SurfaceInstance::Parts {
+    std::shared_ptr<InputTap> tap;
+    std::optional<Vexa::DeviceRegistration> registration;
+    std::unique_ptr<Host::HostSession> session;
+    Settings defaults;  // of what was written since
+    std::vector<std::shared_ptr<FrameFeed>> feeds;
+};
+
+SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& library,
+                                 PluggedSurface surface, Settings settings, Hooks hooks)
+    : loop_(loop),
+      library_(library),
+      surface_(std::move(surface)),
+      settings_(std::move(settings)),
+      hooks_(std::move(hooks)),
+      parts_(std::make_unique<Parts>()),
+      worker_(kWorkerLabel) {
+    worker_.submit([this, wanted = settings_]() noexcept {
+        std::string reason;
+        std::shared_ptr<LoopDevice> device;
+        try {
+            parts_->tap = std::make_shared<InputTap>();
+            device = std::make_shared<LoopDevice>(
+                std::make_shared<TappedDevice>(surface_.open(), parts_->tap));
+            parts_->registration.emplace(device);
+            parts_->session = std::make_unique<Host::HostSession>(
+                library_, parts_->registration->service(),
+                [this](const Vexa::HidEvent& event) { deliver(event); });
+            for (const auto& [key, value] : wanted) {
+                parts_->defaults.emplace(key, parts_->session->property(key));
+                parts_->session->setProperty(key, value);
+            }
+            if (surface_.useSetter) {
+                surface_.useSetter([parts = parts_.get()](const std::string& key,
+                                                          const Vexa::PropertyValue& value) {
+                    parts->tap->setProperty(*parts->session, std::string(kPipelineDomain) + key,
+                                            value);
+                });
+            }
+            parts_->session->begin();
+        } catch (const std::exception& error) {
+            reason = error.what();
+            parts_->session.reset();
+            parts_->registration.reset();
+            device.reset();
+        }
+        loop_.post([this, reason, device] {
+            device_ = device;
+            if (state_ == State::Starting) {
+                setState(device ? State::Running : State::Failed, reason);
+            }
+        });
+    });
+}
+
+SurfaceInstance::~SurfaceInstance() {
+    worker_.drain();
+}
+
+void SurfaceInstance::end(std::function<void()> done) {
+    setState(State::Ending, reason_);
+    worker_.submit([this, done = std::move(done)]() mutable noexcept {
+        try {
+            if (parts_->session) {
+                parts_->session->end();
+            }
+        } catch (const std::exception&) {
+            // All that could be taken back has been.
+        }
+        parts_->session.reset();
+        parts_->registration.reset();
+        for (const auto& feed : parts_->feeds) {
+            parts_->tap->remove(feed);
+        }
+        loop_.post(std::move(done));
+    });
+}
+
+std::string SurfaceInstance::stateText() const {
+    switch (state_) {
+        case State::Starting:
+            return "starting";
+        case State::Running:
+            return "running";
+        case State::Failed:
+            return "failed";
+        case State::Ending:
+            return "ending";
+    }
+    return "";
+}
+
+ReportCounts SurfaceInstance::counts() const noexcept {
+    return device_ ? device_->counts() : ReportCounts{};
+}
+
+void SurfaceInstance::setState(State state, const std::string& reason) {
+    state_ = state;
+    reason_ = reason;
+    hooks_.onState();
+}
+
+void SurfaceInstance::deliver(const Vexa::HidEvent& event) {
+    if (hooks_.onEvent) {
+        hooks_.onEvent(event);
+    }
+    const std::uint64_t now = Vexa::HostClock::system().now();
+    bool post = false;
+    {
+        const Vexa::MutexLock guard(lock_);
+        if (inbox_.events.size() < kMostGestures) {
+            inbox_.events.push_back(DeliveredEvent::of(event, now));
+            inbox_.hostTimesNs.push_back(Util::nanosecondsFromMachTime(now));
+        } else {
+            ++inbox_.lost;
+        }
+        post = !std::exchange(inboxPosted_, true);
+    }
+    if (post) {
+        loop_.post([this] { takeGestures(); });
+    }
+}
+
+void SurfaceInstance::takeGestures() {
+    Gestures taken;
+    {
+        const Vexa::MutexLock guard(lock_);
+        taken = std::exchange(inbox_, {});
+        inboxPosted_ = false;
+    }
+    gestures_ += taken.events.size();
+    hooks_.onGestures(taken);
+}
+
+template <typename Value, typename Work>
+void SurfaceInstance::ask(Work work, std::function<void(const Outcome<Value>& outcome)> done) {
+    if (state_ != State::Running) {
+        throw BusError(
+            ErrorName::kNotRunning,
+            "the surface is not running: " + (reason_.empty() ? "it is " + stateText() : reason_));
+    }
+    if (waiting_ >= kMostWaiting) {
+        throw BusError(ErrorName::kBusy, "too many calls wait for this surface; try again");
+    }
+    ++waiting_;
+    worker_.submit([this, work = std::move(work), done = std::move(done)]() mutable noexcept {
+        Outcome<Value> outcome;
+        try {
+            outcome.value = work(*parts_);
+        } catch (const BusError& error) {
+            outcome.error = error;
+        } catch (const std::exception& error) {
+            outcome.error = BusError(ErrorName::kFailed, error.what());
+        }
+        loop_.post([this, outcome = std::move(outcome), done = std::move(done)] {
+            --waiting_;
+            done(outcome);
+        });
+    });
+}
+
+void SurfaceInstance::get(const std::string& key,
+                          std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done) {
+    ask<Vexa::PropertyValue>(
+        [key](Parts& parts) {
+            Vexa::PropertyValue value = parts.session->property(key);
+            if (!value) {
+                throw BusError(ErrorName::kUnknownKey,
+                               key + ": there is no such property, or it has no value");
+            }
+            return value;
+        },
+        std::move(done));
+}
+
+void SurfaceInstance::set(const std::string& key, const Vexa::PropertyValue& value,
+                          std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done) {
+    const bool keeps = isSetting(key);
+    ask<Vexa::PropertyValue>(
+        [key, value, keeps](Parts& parts) {
+            const Vexa::PropertyValue before = parts.session->property(key);
+            if (!key.starts_with(kPipelineDomain) && !before) {
+                throw BusError(ErrorName::kUnknownKey, key + ": the device has no such property");
+            }
+            if (keeps) {
+                parts.defaults.emplace(key, before);
+            }
+            if (!parts.tap->setProperty(*parts.session, key, value)) {
+                throw notTaken(key);
+            }
+            return parts.session->property(key);
+        },
+        [this, key, value, keeps,
+         done = std::move(done)](const Outcome<Vexa::PropertyValue>& outcome) {
+            if (keeps && outcome.value) {
+                settings_.insert_or_assign(key, value);
+            }
+            done(outcome);
+        });
+}
+
+void SurfaceInstance::reset(std::function<void(const Outcome<bool>& outcome)> done) {
+    ask<bool>(
+        [](Parts& parts) {
+            for (const auto& [key, value] : parts.defaults) {
+                if (!parts.tap->setProperty(*parts.session, key, value)) {
+                    throw notTaken(key);
+                }
+            }
+            return true;
+        },
+        [this, done = std::move(done)](const Outcome<bool>& outcome) {
+            if (outcome.value) {
+                settings_.clear();
+            }
+            done(outcome);
+        });
+}
+
+void SurfaceInstance::addFeed(
+    const std::shared_ptr<FrameFeed>& feed,
+    std::function<void(const Outcome<std::shared_ptr<InputTap>>& outcome)> done) {
+    ask<std::shared_ptr<InputTap>>(
+        [feed](Parts& parts) {
+            // Those that nobody reads any more are only ours.
+            std::erase_if(parts.feeds, [](const auto& each) { return each.use_count() == 1; });
+            parts.feeds.push_back(feed);
+            parts.tap->add(feed, *parts.session);
+            return parts.tap;
+        },
+        std::move(done));
+}
+
+void SurfaceInstance::ping(std::function<void()> answered) {
+    // Its end is the answer, so that a thread that has ended in order does not owe one.
+    const std::shared_ptr<void> token(
+        nullptr, [&loop = loop_, answered = std::move(answered)](void*) { loop.post(answered); });
+    if (state_ == State::Running && device_) {
+        device_->submit([token]() noexcept {});
+    }
+}
+
+}  // namespace VexaTouch::Tools::Daemon

@@ -1,0 +1,138 @@
+#pragma once
+
+#include "Host/HostSession.h"
+#include "Host/PluginLibrary.h"
+#include "Platform/DeviceBackend.h"
+#include "Platform/Mutex.h"
+#include "Platform/PropertyValue.h"
+#include "Platform/SerialQueue.h"
+#include "Platform/ThreadAnnotations.h"
+#include "Tools/Daemon/BusError.h"
+#include "Tools/Daemon/DeviceSource.h"
+#include "Tools/Daemon/EventLoop.h"
+#include "Tools/Daemon/LoopDevice.h"
+#include "Tools/DeliveredEvent.h"
+#include "Tools/FileDescriptor.h"
+#include "Tools/FrameFeed.h"
+#include "Tools/InputTap.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace VexaTouch::Tools::Daemon {
+
+/// What came of something that was asked for: a value or an error.
+template <typename Value>
+struct Outcome {
+    std::optional<Value> value = {};
+    std::optional<BusError> error = {};
+};
+
+/// Settings by the keys of the service.
+using Settings = std::map<std::string, Vexa::PropertyValue>;
+
+/// Gestures in their order, and how many are missing before them.
+struct Gestures {
+    std::vector<DeliveredEvent> events;
+    std::vector<std::uint64_t> hostTimesNs;  ///< of each, when the host got it
+    std::uint64_t lost = 0;
+};
+
+/// One surface with its own instance of the plug-in, from being plugged in to being taken down.
+///
+/// All that may wait for the device (the plug-in's life, its properties) happens on a thread of its
+/// own, in the order in which it was asked for; the loop's thread asks and is answered. Public
+/// operations are for the loop's thread.
+class SurfaceInstance {
+public:
+    /// Questions that wait; beyond that the answer is Busy.
+    static constexpr std::size_t kMostWaiting = 32;
+    /// Gestures that wait for the loop; beyond that they are dropped and counted.
+    static constexpr std::size_t kMostGestures = 1024;
+
+    enum class State : std::uint8_t { Starting, Running, Failed, Ending };
+
+    struct Hooks {
+        /// The state is another one.
+        std::function<void()> onState;
+        std::function<void(const Gestures& gestures)> onGestures;
+        /// Each event, on the host's queue as it is delivered; must not throw.
+        std::function<void(const Vexa::HidEvent& event)> onEvent;
+    };
+
+    /// Begins to start: opens the device and walks the plug-in's life. `settings` are written
+    /// before the first report. Everything given must outlive it.
+    SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& library, PluggedSurface surface,
+                    Settings settings, Hooks hooks);
+    /// Not before end() has called back.
+    ~SurfaceInstance();
+    SurfaceInstance(const SurfaceInstance&) = delete;
+    SurfaceInstance(SurfaceInstance&&) = delete;
+    SurfaceInstance& operator=(const SurfaceInstance&) = delete;
+    SurfaceInstance& operator=(SurfaceInstance&&) = delete;
+
+    /// Takes everything back in order: device closed, unscheduled, stopped, released. Calls back
+    /// last of all; no other callback comes afterwards. Once.
+    void end(std::function<void()> done);
+
+    [[nodiscard]] State state() const noexcept { return state_; }
+    /// "starting", "running", "failed", "ending".
+    [[nodiscard]] std::string stateText() const;
+    /// Why it failed, or empty.
+    [[nodiscard]] const std::string& reason() const noexcept { return reason_; }
+    [[nodiscard]] const PluggedSurface& surface() const noexcept { return surface_; }
+    /// Those that were written and are in force.
+    [[nodiscard]] const Settings& settings() const noexcept { return settings_; }
+    [[nodiscard]] ReportCounts counts() const noexcept;
+    [[nodiscard]] std::uint64_t gestures() const noexcept { return gestures_; }
+
+    // Each throws BusError (NotRunning, Busy) or calls back later.
+
+    void get(const std::string& key,
+             std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done);
+    /// Gives what the property is afterwards; no value when it cannot be read.
+    void set(const std::string& key, const Vexa::PropertyValue& value,
+             std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done);
+    /// Writes back every setting as it was when the plug-in started, and forgets them.
+    void reset(std::function<void(const Outcome<bool>& outcome)> done);
+    /// Fills the feed from now on. The tap is for removing it again.
+    void addFeed(const std::shared_ptr<FrameFeed>& feed,
+                 std::function<void(const Outcome<std::shared_ptr<InputTap>>& outcome)> done);
+
+    /// Calls back once the thread that takes the reports has answered, or when there is none that
+    /// could.
+    void ping(std::function<void()> answered);
+
+private:
+    struct Parts;
+
+    void setState(State state, const std::string& reason);
+    void deliver(const Vexa::HidEvent& event) EXCLUDES(lock_);
+    void takeGestures() EXCLUDES(lock_);
+    template <typename Value, typename Work>
+    void ask(Work work, std::function<void(const Outcome<Value>& outcome)> done);
+
+    EventLoop& loop_;
+    const Host::PluginLibrary& library_;
+    PluggedSurface surface_;
+    Settings settings_;
+    Hooks hooks_;
+    State state_ = State::Starting;
+    std::string reason_;
+    std::size_t waiting_ = 0;
+    std::uint64_t gestures_ = 0;
+    std::shared_ptr<LoopDevice> device_;  // once running
+    std::unique_ptr<Parts> parts_;        // the worker's
+    Vexa::Mutex lock_;
+    Gestures inbox_ GUARDED_BY(lock_);
+    bool inboxPosted_ GUARDED_BY(lock_) = false;
+    Vexa::SerialQueue worker_;
+};
+
+}  // namespace VexaTouch::Tools::Daemon
