@@ -23,6 +23,8 @@ bool DeviceBackend::setProperty(const PropertyValue& /*key*/,
     return false;
 }
 
+void DeviceBackend::reportArrived(std::span<const std::uint8_t> /*report*/) noexcept {}
+
 void DeviceBackend::reportHandled() noexcept {}
 
 namespace {
@@ -53,6 +55,10 @@ constexpr vexa_device_backend kTable{
     },
     .report_handled = [](void* context) { backendOf(context).reportHandled(); },
     .destroy = [](void* context) { delete static_cast<Owner*>(context); },
+    .report_arrived =
+        [](void* context, const std::uint8_t* report, std::size_t length) {
+            backendOf(context).reportArrived({report, length});
+        },
 };
 
 }  // namespace

@@ -32,6 +32,8 @@ public:
     virtual PropertyValue property(const PropertyValue& key) noexcept;
     /// False unless overridden.
     virtual bool setProperty(const PropertyValue& key, const PropertyValue& value) noexcept;
+    /// One report was read and goes to the service next. On the input thread; must not block.
+    virtual void reportArrived(std::span<const std::uint8_t> report) noexcept;
     /// One report was handled by the service. On the input thread; must not block.
     virtual void reportHandled() noexcept;
 };

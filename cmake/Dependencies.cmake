@@ -1,6 +1,7 @@
 # What is used from Debian (installed by script/bootstrap):
 #   HeaderOnlyBoost, HeaderOnlyCli, HeaderOnlySpdlog, HeaderOnlyFmt,
 #   HeaderOnlySystemd, HeaderOnlySdt              header-only, so they serve a cross build as well
+#   VexaUdev                         libudev
 #   VexaGoogleTest                   gtest and gmock with their main
 #   rapidcheck, benchmark::benchmark_main
 find_package(Threads REQUIRED)
@@ -39,6 +40,23 @@ if(CMAKE_CROSSCOMPILING)
          DESTINATION "${PROJECT_BINARY_DIR}/header-only-sdt/sys")
     target_include_directories(HeaderOnlySdt SYSTEM INTERFACE
                                "${PROJECT_BINARY_DIR}/header-only-sdt")
+endif()
+
+# A library to be linked. A cross build that has none for its machine compiles all the same; what
+# uses it cannot be linked then.
+add_library(VexaUdev INTERFACE)
+if(NOT EXISTS /usr/include/libudev.h)
+    message(FATAL_ERROR "/usr/include/libudev.h is missing: run script/bootstrap first")
+endif()
+find_library(VEXA_UDEV_LIBRARY udev)
+if(VEXA_UDEV_LIBRARY)
+    target_link_libraries(VexaUdev INTERFACE "${VEXA_UDEV_LIBRARY}")
+elseif(NOT CMAKE_CROSSCOMPILING)
+    message(FATAL_ERROR "libudev is missing: run script/bootstrap first")
+endif()
+if(CMAKE_CROSSCOMPILING)
+    file(COPY /usr/include/libudev.h DESTINATION "${PROJECT_BINARY_DIR}/header-only-udev")
+    target_include_directories(VexaUdev SYSTEM INTERFACE "${PROJECT_BINARY_DIR}/header-only-udev")
 endif()
 
 if(VEXA_TESTS)

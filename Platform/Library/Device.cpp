@@ -234,6 +234,7 @@ bool vexa_device::serve(std::uint64_t watch, std::uint32_t events) noexcept {
         length = *report;
         target = target_;
     }
+    backend_->reportArrived(target.buffer, length);
     target.callback(target.context, VEXA_STATUS_SUCCESS, this, VEXA_REPORT_INPUT,
                     length > 0 ? target.buffer[0] : 0U, target.buffer, length, timestamp);
     backend_->reportHandled();

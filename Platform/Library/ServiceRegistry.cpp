@@ -47,6 +47,10 @@ void Backend::reportHandled() const noexcept {
     if (table_.report_handled) table_.report_handled(context_);
 }
 
+void Backend::reportArrived(const std::uint8_t* report, std::size_t length) const noexcept {
+    if (table_.report_arrived) table_.report_arrived(context_, report, length);
+}
+
 namespace {
 
 class Registry {

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <vexa/device.h>
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 
@@ -26,6 +27,7 @@ public:
     vexa_value* copyProperty(const vexa_value* key) const noexcept;
     bool setProperty(const vexa_value* key, const vexa_value* value) const noexcept;
     void reportHandled() const noexcept;
+    void reportArrived(const std::uint8_t* report, std::size_t length) const noexcept;
 
 private:
     vexa_device_backend table_{};

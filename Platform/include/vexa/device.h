@@ -57,6 +57,10 @@ typedef struct vexa_device_backend {
     void (*report_handled)(void* context);
     /* The last reference to the back-end is gone: the registration's and every device's. */
     void (*destroy)(void* context);
+    /* Called on the run loop's thread with each report just read, before the callback: `length`
+     * bytes as the callback gets them, which are only good during the call. NULL: not told. Must
+     * not block. */
+    void (*report_arrived)(void* context, const uint8_t* report, size_t length);
 } vexa_device_backend;
 
 VEXA_BEGIN_C
