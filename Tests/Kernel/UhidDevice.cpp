@@ -14,7 +14,7 @@
 #include <fstream>
 #include <system_error>
 
-namespace VexaTouch::Test {
+namespace VexaTouch::Testing {
 namespace {
 
 [[noreturn]] void fail(const char* what) {
@@ -150,4 +150,4 @@ void UhidDevice::answer(std::uint32_t request, std::uint8_t reportId) {
     writeEvent(uhid_.get(), event, sizeof reply, "answering a feature request");
 }
 
-}  // namespace VexaTouch::Test
+}  // namespace VexaTouch::Testing

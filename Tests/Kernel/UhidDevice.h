@@ -14,7 +14,7 @@
 #include <thread>
 #include <vector>
 
-namespace VexaTouch::Test {
+namespace VexaTouch::Testing {
 
 /// A surface that the kernel takes for a real one, made through /dev/uhid; plugged in as long as it
 /// lives. Any thread. Operations throw std::system_error when the kernel refuses them.
@@ -66,4 +66,4 @@ private:
     std::thread thread_;
 };
 
-}  // namespace VexaTouch::Test
+}  // namespace VexaTouch::Testing

@@ -38,7 +38,7 @@
 namespace {
 
 using namespace std::chrono_literals;
-using VexaTouch::Test::UhidDevice;
+using VexaTouch::Testing::UhidDevice;
 using VexaTouch::Tools::Failure;
 using Clock = std::chrono::steady_clock;
 
