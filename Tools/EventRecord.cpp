@@ -15,21 +15,6 @@
 namespace VexaTouch::Tools {
 namespace {
 
-struct KindEntry {
-    EventKind kind;
-    std::string_view name;
-};
-
-constexpr std::array<KindEntry, 7> kKinds = {{
-    {EventKind::MayBegin, "may-begin"},
-    {EventKind::HoldStart, "hold-start"},
-    {EventKind::HoldChange, "hold-change"},
-    {EventKind::HoldEnd, "hold-end"},
-    {EventKind::Tap, "tap"},
-    {EventKind::Cancel, "cancel"},
-    {EventKind::FirmwareReset, "firmware-reset"},
-}};
-
 /// What each region does, by region number.
 struct RegionEntry {
     std::string_view onTap;
@@ -43,24 +28,6 @@ constexpr std::array<RegionEntry, 4> kRegions = {{
     {"volume down", "volume decrement", "volume down or decrement"},
     {"volume up", "volume increment", "volume up or increment"},
 }};
-
-EventKind kindOfDigitizerPhase(Vexa::HidEventPhase phase) {
-    switch (phase) {
-        case Vexa::HidEventPhase::MayBegin:
-            return EventKind::MayBegin;
-        case Vexa::HidEventPhase::Began:
-            return EventKind::HoldStart;
-        case Vexa::HidEventPhase::Changed:
-            return EventKind::HoldChange;
-        case Vexa::HidEventPhase::Ended:
-            return EventKind::HoldEnd;
-        case Vexa::HidEventPhase::Cancelled:
-            return EventKind::Cancel;
-        case Vexa::HidEventPhase::None:
-            break;
-    }
-    return EventKind::Tap;
-}
 
 void appendNumberMember(std::string& text, std::string_view name, std::uint64_t value) {
     text += ",\"";
@@ -104,30 +71,17 @@ EventKind kindMember(const Vexa::PropertyValue& object) {
 
 }  // namespace
 
-std::string_view eventKindName(EventKind kind) noexcept {
-    return std::ranges::find(kKinds, kind, &KindEntry::kind)->name;
-}
-
-std::optional<EventKind> eventKindFromName(std::string_view name) noexcept {
-    const auto found = std::ranges::find(kKinds, name, &KindEntry::name);
-    if (found == kKinds.end()) {
-        return std::nullopt;
-    }
-    return found->kind;
-}
-
 EventRecord eventRecordFromHidEvent(const Vexa::HidEvent& event) {
     EventRecord record;
+    const Host::GestureEvent gesture = Host::GestureEvent::of(event);
+    record.kind = gesture.kind;
+    record.region = gesture.region;
     const auto digitizer = event.digitizerRecord();
     if (!digitizer) {
-        // The pipeline makes one vendor-defined event only: the notice of a firmware reset.
-        record.kind = EventKind::FirmwareReset;
         return record;
     }
-    record.kind = kindOfDigitizerPhase(event.phase());
     record.frame =
         static_cast<std::uint32_t>(event.integerField(Vexa::HidEventField::DigitizerFrameNumber));
-    record.region = static_cast<std::uint32_t>(digitizer->y);
     record.phase = static_cast<std::uint32_t>(event.phase());
     record.mask = digitizer->eventMask;
     return record;

@@ -1,28 +1,18 @@
 #pragma once
 
+#include "Host/GestureEvent.h"
 #include "Platform/HidEvent.h"
 
 #include <cstdint>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 namespace VexaTouch::Tools {
 
-enum class EventKind : std::uint8_t {
-    MayBegin,
-    HoldStart,
-    HoldChange,
-    HoldEnd,
-    Tap,
-    Cancel,
-    FirmwareReset,
-};
-
-/// "may-begin", "hold-start", "hold-change", "hold-end", "tap", "cancel", "firmware-reset".
-std::string_view eventKindName(EventKind kind) noexcept;
-std::optional<EventKind> eventKindFromName(std::string_view name) noexcept;
+using Host::EventKind;
+using Host::eventKindFromName;
+using Host::eventKindName;
 
 /// One event of a replay, flat.
 struct EventRecord {

@@ -2,6 +2,7 @@
 #   HeaderOnlyBoost, HeaderOnlyCli, HeaderOnlySpdlog, HeaderOnlyFmt,
 #   HeaderOnlySystemd, HeaderOnlySdt              header-only, so they serve a cross build as well
 #   VexaUdev                         libudev
+#   Libevdev                         to be linked; a cross build needs the target machine's
 #   VexaGoogleTest                   gtest and gmock with their main
 #   rapidcheck, benchmark::benchmark_main
 find_package(Threads REQUIRED)
@@ -58,6 +59,23 @@ if(CMAKE_CROSSCOMPILING)
     file(COPY /usr/include/libudev.h DESTINATION "${PROJECT_BINARY_DIR}/header-only-udev")
     target_include_directories(VexaUdev SYSTEM INTERFACE "${PROJECT_BINARY_DIR}/header-only-udev")
 endif()
+
+# The header stands in a folder of its own. A cross build finds the target machine's library where
+# Debian puts it; without one it still builds whatever has no keyboard.
+find_path(VEXA_LIBEVDEV_HEADERS libevdev/libevdev.h PATHS /usr/include PATH_SUFFIXES libevdev-1.0
+          NO_CMAKE_FIND_ROOT_PATH)
+if(NOT VEXA_LIBEVDEV_HEADERS)
+    message(FATAL_ERROR "libevdev/libevdev.h is missing: run script/bootstrap first")
+endif()
+find_library(VEXA_LIBEVDEV evdev
+             PATHS "/usr/lib/${CMAKE_SYSTEM_PROCESSOR}-linux-gnu" NO_CMAKE_FIND_ROOT_PATH
+             NO_DEFAULT_PATH)
+if(NOT VEXA_LIBEVDEV)
+    set(VEXA_LIBEVDEV evdev)
+endif()
+add_library(Libevdev INTERFACE)
+target_include_directories(Libevdev SYSTEM INTERFACE "${VEXA_LIBEVDEV_HEADERS}")
+target_link_libraries(Libevdev INTERFACE "${VEXA_LIBEVDEV}")
 
 if(VEXA_TESTS)
     add_library(VexaGoogleTest INTERFACE)
