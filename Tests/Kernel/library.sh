@@ -23,6 +23,9 @@ wait_until() {
 }
 
 has_line() { grep -q -- "$2" "$1" 2>/dev/null; }
+has_lines() { [ "$(wc -l <"$1")" -ge "$2" ]; }
+has_surface() { ls /dev/hidraw* >/dev/null 2>&1; }
+has_input_thread() { grep -q '^vexa-input$' "/proc/$1"/task/*/comm 2>/dev/null; }
 is_gone() { ! kill -0 "$1" 2>/dev/null; }
 
 # same WHAT EXPECTED FOUND: two files.
