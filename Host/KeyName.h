@@ -16,7 +16,7 @@ inline constexpr KeyCode kHighestKey = 0x2FE;
 /// taken for a mouse. Any thread.
 [[nodiscard]] std::optional<KeyCode> keyFromName(std::string_view name) noexcept;
 
-/// The kernel's name of the key, of several the usual one; empty when it has none. Any thread.
+/// The kernel's name of the key; empty when it has none. Any thread.
 [[nodiscard]] std::string_view keyName(KeyCode key) noexcept;
 
 }  // namespace VexaTouch::Host

@@ -4,6 +4,7 @@
 #include "Tools/DiffCommand.h"
 #include "Tools/GetCommand.h"
 #include "Tools/InfoCommand.h"
+#include "Tools/KeysCommand.h"
 #include "Tools/LatencyCommand.h"
 #include "Tools/ReplayCommand.h"
 #include "Tools/RunCommand.h"
@@ -21,8 +22,8 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &runCommand,  &getCommand,  &setCommand,     &latencyCommand, &validateCommand, &replayCommand,
-    &infoCommand, &showCommand, &convertCommand, &synthCommand,   &diffCommand,
+    &runCommand,    &getCommand,  &setCommand,  &keysCommand,    &latencyCommand, &validateCommand,
+    &replayCommand, &infoCommand, &showCommand, &convertCommand, &synthCommand,   &diffCommand,
 };
 
 }  // namespace

@@ -46,8 +46,15 @@ LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<Playe
       inbox_(wake),
       registration_(device),
       session_(library, registration_.service(), [this](const Vexa::HidEvent& event) {
-          inbox_.put(DeliveredEvent::of(event, nowTicks()));
+          const DeliveredEvent delivered = DeliveredEvent::of(event, nowTicks());
+          if (keys_) {
+              keys_->handle(event);
+          }
+          inbox_.put(delivered);
       }) {
+    if (options_.keyboard != nullptr) {
+        keys_.emplace(options_.keyMap, *options_.keyboard);
+    }
     if (options_.show) {
         surface_ = std::make_unique<LiveSurface>(options_.depth, streams_.columns, startNs_,
                                                  options_.settings);
@@ -98,9 +105,13 @@ void LiveRun::run() {
         waitForWork();
     }
     session_.halt();
+    if (keys_) {
+        keys_->releaseAll();
+    }
     takeEvents();
     draw(true);
     screen_.reset();
+    tellOfKeyboard();
     if (!options_.recordFile.empty()) {
         writeRecording();
     }
@@ -130,6 +141,8 @@ void LiveRun::handleWork() {
     if (screen_) {
         handleKeys();
         draw(false);
+    } else {
+        tellOfKeyboard();
     }
     writeRecordingOnWish();
 }
@@ -187,6 +200,15 @@ void LiveRun::draw(bool anyway) {
     lines.insert(lines.end(), newest_.begin(), newest_.end());
     lines.resize(std::min<std::size_t>(lines.size(), std::max(streams_.rows, 2U) - 1));
     screen_->draw(lines);
+}
+
+void LiveRun::tellOfKeyboard() const {
+    if (options_.keyboard == nullptr) {
+        return;
+    }
+    if (const auto failure = options_.keyboard->takeFailure()) {
+        streams_.error << "vexatouch run: " << *failure << std::endl;
+    }
 }
 
 void LiveRun::writeRecordingOnWish() {

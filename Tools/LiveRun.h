@@ -1,7 +1,10 @@
 #pragma once
 
 #include "Host/HostSession.h"
+#include "Host/KeyMap.h"
+#include "Host/MediaKeys.h"
 #include "Host/PluginLibrary.h"
+#include "Host/SharedKeyboard.h"
 #include "Platform/DeviceBackend.h"
 #include "Tools/DeliveredEvent.h"
 #include "Tools/EventInbox.h"
@@ -35,6 +38,9 @@ struct LiveRunOptions {
     std::string recordFile = {};  ///< where the recording goes; empty: nowhere
     std::optional<std::chrono::nanoseconds> duration = {};
     std::optional<std::uint64_t> count = {};  ///< of events
+    /// What the gestures' keys are pressed on; null: nothing. It must outlive the run.
+    Host::SharedKeyboard* keyboard = nullptr;
+    Host::KeyMap keyMap = {};
 };
 
 /// A service run by a host from its first step to its last: a plug-in, a device and somebody who
@@ -42,7 +48,8 @@ struct LiveRunOptions {
 /// after a number of events, at a signal, or when nobody takes the events any more.
 ///
 /// The thread that runs it prints, draws and writes; the input thread and the device's player only
-/// ever leave things for it.
+/// ever leave things for it. Keys are pressed on the thread that delivers the events; none is down
+/// when run() returns.
 class LiveRun {
 public:
     /// Walks the plug-in's life up to its event callback and gives it the settings. `signals` and
@@ -76,6 +83,7 @@ private:
     void print(const DeliveredEvent& event);
     void handleKeys();
     void draw(bool anyway);
+    void tellOfKeyboard() const;
     void writeRecordingOnWish();
     void writeRecording();
     void printSummary() const;
@@ -98,6 +106,7 @@ private:
     // Set by the device's threads.
     std::atomic<bool> finished_ = false;
     std::atomic<bool> unplugged_ = false;
+    std::optional<Host::MediaKeys> keys_;  // outlives the session, whose events come to it
     Vexa::DeviceRegistration registration_;
     Host::HostSession session_;
 };

@@ -3,6 +3,7 @@
 #include "Host/PluginLibrary.h"
 #include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
+#include "Tools/KeyOptions.h"
 #include "Tools/LiveRun.h"
 #include "Tools/LogOptions.h"
 #include "Tools/OptionValues.h"
@@ -14,6 +15,7 @@
 #include <array>
 #include <cstdint>
 #include <filesystem>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <system_error>
@@ -22,7 +24,7 @@
 namespace VexaTouch::Tools {
 namespace {
 
-constexpr std::array<OptionEntry, 12> kOptions = {{
+constexpr std::array<OptionEntry, 14> kOptions = {{
     kDeviceOption,
     {.name = "--set",
      .valueName = "KEY=VALUE",
@@ -32,6 +34,10 @@ constexpr std::array<OptionEntry, 12> kOptions = {{
      .kind = ValueKind::Choice,
      .choices = "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= "
                 "EnableTapSuppression= VirtualNormalizationFactors. ResetEventStats="},
+    {.name = "--keys",
+     .help = "Send the keys of the gestures to the system, through a keyboard that uinput makes; "
+             "--key alone does so too. Without either none are sent"},
+    kKeyOption,
     {.name = "--json", .help = "Print each event as one JSON object on a line"},
     {.name = "--show",
      .help =
@@ -67,7 +73,7 @@ constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
     {kExitUsage, "the command line is wrong, an unknown setting included"},
 }};
 
-constexpr std::array<ExampleEntry, 5> kExamples = {{
+constexpr std::array<ExampleEntry, 6> kExamples = {{
     {"vexatouch run --show", "Plays random gestures and draws the surface until q or Ctrl-C"},
     {"vexatouch run --device sim:Examples/taps.gesture",
      "Plays a script of gestures in real time and prints what the service makes of it"},
@@ -75,6 +81,8 @@ constexpr std::array<ExampleEntry, 5> kExamples = {{
      "Sends a recording through the service as fast as it goes"},
     {"vexatouch run --set HoldTimeoutMilliseconds=300 --duration 10s --record try.json",
      "Tries a setting and keeps the session"},
+    {"vexatouch run --keys --key tap:1=KEY_NEXTSONG --key hold:1=none",
+     "Sends media keys, two of them changed"},
     {"vexatouch run --record session.json & sleep 5; kill -USR1 $!",
      "Looks into a run that goes on"},
 }};
@@ -89,6 +97,11 @@ constexpr std::string_view kDescription =
     "The run ends when the device has played everything, after --duration or --count, when nobody "
     "reads the events any more, and at SIGINT, SIGTERM or SIGHUP: in order, with the whole "
     "teardown. A second signal ends it at once.\n"
+    "\n"
+    "Keys are sent only when asked for. Which gesture sends which, vexatouch keys prints. When the "
+    "keyboard cannot be made, the run says what to do and goes on without; it makes it through "
+    "/dev/uinput unless the environment variable VEXATOUCH_UINPUT names another node. No key stays "
+    "down when the run ends.\n"
     "\n"
     "The plug-in is looked for beside the program and in the library folder of its prefix; the "
     "environment variable VEXATOUCH_PLUGIN names another.";
@@ -141,6 +154,7 @@ DeviceWishes parseWishes(const Arguments& arguments, const DeviceChoice& choice)
 
 int runRun(const Arguments& arguments, Streams& streams) {
     LiveRunOptions options = parseOptions(arguments, streams);
+    options.keyMap = parseKeyMap(arguments.values(kKeyOption.name));
     const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
     const DeviceWishes wishes = parseWishes(arguments, choice);
     if (!options.recordFile.empty()) {
@@ -152,6 +166,11 @@ int runRun(const Arguments& arguments, Streams& streams) {
     SignalWatch signals(wake);
     const auto device = makeDevice(choice, wishes, streams);
     const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
+    std::unique_ptr<Host::SharedKeyboard> keyboard;
+    if (arguments.given("--keys") || arguments.given(kKeyOption.name)) {
+        keyboard = makeKeyboard(options.keyMap, "run", streams);
+        options.keyboard = keyboard.get();
+    }
     LiveRun(library, device, std::move(options), signals, wake, streams).run();
     return kExitSuccess;
 }
