@@ -167,7 +167,7 @@ TEST(HidrawKernelTest, ReaderThatStallsLosesTheNewestReportsAndCountsAGap) {
     EXPECT_EQ(session->property("DisjointImageCount"), PropertyValue(1U));
     session->end();
     EXPECT_EQ(device->handled.count(), 65U);
-    EXPECT_THAT(log.take(), ElementsAre(error("Disjoint image (frame number: 63 -> 201) ***")));
+    EXPECT_THAT(log.take(), ElementsAre(error("Disjoint image (frame number: 63 -> 201) ***\n\n")));
 }
 
 TEST(HidrawKernelTest, TwoSurfacesServeTheirOwnSessions) {

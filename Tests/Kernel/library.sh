@@ -3,7 +3,7 @@
 
 folder=$(mktemp -d)
 cd "$folder"
-surface=
+surface= node=
 trap 'kill $(jobs -p) 2>/dev/null || true' EXIT
 
 fail() {
@@ -11,14 +11,15 @@ fail() {
     exit 1
 }
 
-# wait_until WHAT COMMAND...: for at most 20 s.
+# wait_until WHAT COMMAND...: for at most 20 s. Each look costs the machine a millisecond or two, so wait
+# for lines of a pipe where there is one.
 wait_until() {
-    local what=$1 left=4000
+    local what=$1 left=1000
     shift
     until "$@"; do
         left=$((left - 1))
         [ "$left" -gt 0 ] || fail "waited in vain: $what"
-        usleep 5000
+        usleep 20000
     done
 }
 
@@ -35,28 +36,25 @@ same() {
     fail "$1 differ"
 }
 
-# tell COMMAND...: to the surface (see UhidSurface), and waits until it is done.
+# tell COMMAND...: to the surface (see UhidSurface), and waits until it has answered with a line.
 tell() {
     if [ -z "$surface" ]; then
-        mkfifo commands
-        : >answers
-        UhidSurface <commands >>answers 2>&1 &
+        mkfifo commands answering
+        UhidSurface <commands >answering 2>faults &
         surface=$!
-        exec 7>commands
-        answers=0
+        exec 7>commands 8<answering
     fi
     echo "$*" >&7
-    answers=$((answers + 1))
-    wait_until "$*" _surface_answered
+    read -r -t 30 answer <&8 || fail "$*: $(cat faults)"
+    case $answer in node*) node=${answer#node } ;; esac
 }
 
-_surface_answered() {
-    if is_gone "$surface"; then
-        cat answers
-        fail "the surface is gone"
-    fi
-    [ "$(wc -l <answers)" -ge "$answers" ]
+# A reader of the keys, whose lines go to "keys", has opened its device when this returns.
+read_keys() {
+    [ -e reading ] || mkfifo reading
+    KeyReader 'Vexa Touch media keys' 2>reading >keys &
+    reader=$!
+    exec 9<reading
+    read -r -t 30 line <&9 || fail "no reader of keys"
+    case $line in reading*) ;; *) fail "$line" ;; esac
 }
-
-# The node of the surface that was plugged in last.
-node() { sed -n 's/^node //p' answers | tail -n 1; }
