@@ -27,6 +27,8 @@ has_line() { grep -q -- "$2" "$1" 2>/dev/null; }
 has_lines() { [ "$(wc -l <"$1")" -ge "$2" ]; }
 has_surface() { ls /dev/hidraw* >/dev/null 2>&1; }
 has_input_thread() { grep -q '^vexa-input$' "/proc/$1"/task/*/comm 2>/dev/null; }
+# The device's own descriptor comes first, the one that its input is read from second.
+has_reader() { [ "$(ls -l "/proc/$1/fd" 2>/dev/null | grep -c '/dev/hidraw')" -ge 2 ]; }
 is_gone() { ! kill -0 "$1" 2>/dev/null; }
 
 # same WHAT EXPECTED FOUND: two files.
