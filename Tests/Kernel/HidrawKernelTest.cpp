@@ -14,6 +14,7 @@ namespace {
 
 using Features = UhidDevice::Features;
 using ::testing::ElementsAre;
+using ::testing::IsEmpty;
 using Vexa::HidrawDevice;
 using Vexa::PropertyValue;
 
@@ -34,6 +35,23 @@ Answer featureReport(HidrawDevice& device, std::uint32_t id) {
     std::size_t length = 0;
     const vexa_status status = device.getReport(VEXA_REPORT_FEATURE, id, room, length);
     return {status, {room.begin(), room.begin() + static_cast<std::ptrdiff_t>(length)}};
+}
+
+/// A surface with an input report that means nothing to the service: the kernel lets only pass what
+/// is declared.
+UhidDevice::Identity withReportThree() {
+    UhidDevice::Identity identity;
+    constexpr std::array<std::uint8_t, 16> kReport = {
+        0x85, 0x03,              // Report ID (3)
+        0x15, 0x00,              // Logical Minimum (0)
+        0x26, 0xFF, 0x00,        // Logical Maximum (255)
+        0x75, 0x08, 0x95, 0x04,  // Report Size (8), Report Count (4)
+        0x09, 0x40, 0x81, 0x02,  // four bytes: Input (Variable)
+        0xC0,                    // End Collection
+    };
+    identity.descriptor.pop_back();
+    identity.descriptor.insert(identity.descriptor.end(), kReport.begin(), kReport.end());
+    return identity;
 }
 
 TEST(HidrawKernelTest, PropertiesAreTheDevicesAndKeepWhatIsWritten) {
@@ -168,6 +186,30 @@ TEST(HidrawKernelTest, ReaderThatStallsLosesTheNewestReportsAndCountsAGap) {
     session->end();
     EXPECT_EQ(device->handled.count(), 65U);
     EXPECT_THAT(log.take(), ElementsAre(error("Disjoint image (frame number: 63 -> 201) ***\n\n")));
+}
+
+TEST(HidrawKernelTest, FloodOfInvalidReportsNeitherFillsTheLogNorKeepsTheNextReportOut) {
+    LogCapture log;
+    Vexa::Log::setLevel(Vexa::LogCategory::HIDService, Vexa::LogLevel::Error);
+    UhidDevice surface(withReportThree());
+    const auto device =
+        std::make_shared<HookedHidraw>(nodeOf(surface), [](const std::string& /*moment*/) {});
+    KernelSession session(device);
+    session->begin();
+    constexpr std::array<std::uint8_t, 5> invalid = {3, 1, 4, 1, 5};
+    constexpr int kReports = 20'000;
+    for (int i = 0; i < kReports; ++i) {
+        surface.send(invalid);
+    }
+    const std::uint64_t events = session.events.count();
+    // The flood may have filled the kernel's ring, but room comes.
+    while (session.events.count() == events) {
+        const std::uint64_t handled = device->handled.count();
+        surface.send(kReset);
+        ASSERT_TRUE(device->handled.waitUntil(handled + 1));
+    }
+    session->end();
+    EXPECT_THAT(log.take(), IsEmpty());
 }
 
 TEST(HidrawKernelTest, TwoSurfacesServeTheirOwnSessions) {

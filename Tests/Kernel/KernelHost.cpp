@@ -1,7 +1,7 @@
 // usage: KernelHost NODE
 //
-// A host at its smallest: the service on a hidraw device, an event a line as JSON, keys on the virtual
-// keyboard; until the device is unplugged.
+// A host at its smallest: the service on a hidraw device, an event a line as JSON, keys on the
+// virtual keyboard; until the device is unplugged.
 
 #include "Host/HostSession.h"
 #include "Host/MediaKeys.h"

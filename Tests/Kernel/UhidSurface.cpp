@@ -10,9 +10,7 @@
 //   play FILE [HZ]        the reports of a recording (.json) or script (.gesture), at their
 //   recorded
 //                         pace or so many a second, "played N"
-//   invalid N             so many reports of a length that nobody expects, as fast as it goes
 //   wait MS
-//   say TEXT              for whoever reads the output
 //
 // Every line is answered on standard output when it is done, so that a script can wait for it.
 
@@ -52,7 +50,6 @@ private:
     UhidDevice& device();
     void plug(std::istringstream& words);
     void play(std::istringstream& words);
-    void sendInvalid(std::istringstream& words);
 
     std::unique_ptr<UhidDevice> device_;
     UhidDevice::Features features_ = UhidDevice::Features::Normal;
@@ -109,17 +106,6 @@ void Commands::play(std::istringstream& words) {
     std::cout << "played " << sent << std::endl;
 }
 
-void Commands::sendInvalid(std::istringstream& words) {
-    std::uint64_t count = 0;
-    words >> count;
-    // A firmware event with more than nine bytes: the kernel lets it pass, the service does not.
-    const std::vector<std::uint8_t> report(60, 2);
-    for (std::uint64_t sent = 0; sent < count; ++sent) {
-        device().send(report);
-    }
-    std::cout << "sent " << count << std::endl;
-}
-
 void Commands::run(const std::string& line) {
     std::istringstream words(line);
     std::string command;
@@ -154,15 +140,11 @@ void Commands::run(const std::string& line) {
         std::cout << "asked " << requests << std::endl;
     } else if (command == "play") {
         play(words);
-    } else if (command == "invalid") {
-        sendInvalid(words);
     } else if (command == "wait") {
         std::uint64_t ms = 0;
         words >> ms;
         std::this_thread::sleep_for(std::chrono::milliseconds(ms));
         std::cout << "waited " << ms << std::endl;
-    } else if (command == "say") {
-        std::cout << line << std::endl;
     } else if (!command.empty()) {
         throw Failure("unknown command " + command);
     }
