@@ -1,6 +1,9 @@
 #include "Tools/DeviceChoice.h"
 
+#include "Host/HostFailure.h"
+#include "Host/SurfaceWatch.h"
 #include "Tools/Failure.h"
+#include "Tools/HidrawSource.h"
 #include "Tools/InputFile.h"
 #include "Tools/RecordedDevice.h"
 #include "Tools/RecordingFile.h"
@@ -8,13 +11,16 @@
 
 #include <charconv>
 #include <cmath>
+#include <stdexcept>
 #include <utility>
+#include <vector>
 
 namespace VexaTouch::Tools {
 namespace {
 
 constexpr std::string_view kSimulated = "sim";
 constexpr std::string_view kRecording = "recording";
+constexpr std::string_view kHidraw = "hidraw";
 constexpr std::string_view kAsFastAsTaken = "max";
 
 /// What was given and the option that it was given to.
@@ -97,6 +103,25 @@ std::shared_ptr<PlayedDevice> makeSurface(const DeviceChoice& choice, const Devi
     return surface;
 }
 
+std::shared_ptr<ObservedDevice> openSurface(const DeviceChoice& choice, const DeviceWishes& wishes,
+                                            Streams& streams) {
+    if (!choice.path.empty()) {
+        return std::make_shared<HidrawSource>(choice.path);
+    }
+    const std::vector<Host::Surface> surfaces = Host::findSurfaces(wishes.match);
+    if (surfaces.empty()) {
+        throw Failure(
+            "no touch surface is plugged in (vexatouch devices --verbose says of each device why "
+            "it is none; --match VENDOR:PRODUCT names one)");
+    }
+    const Host::Surface& first = surfaces.front();
+    if (surfaces.size() > 1) {
+        streams.error << surfaces.size() << " surfaces; this is " << first.node
+                      << " (--device hidraw:NODE for another)\n";
+    }
+    return std::make_shared<HidrawSource>(first.node, first.sysPath);
+}
+
 }  // namespace
 
 DeviceChoice DeviceChoice::parse(std::string_view text, std::string_view option) {
@@ -114,15 +139,44 @@ DeviceChoice DeviceChoice::parse(std::string_view text, std::string_view option)
     if (name == kRecording) {
         return recordingChoice(given, path);
     }
+    if (name == kHidraw) {
+        if (hasPath && path.empty()) {
+            refuse(given, "the node is missing (without the colon: the first surface there is)");
+        }
+        return {.kind = Kind::Hidraw, .path = std::string(path), .speed = 1.0};
+    }
     refuse(given,
-           "expected sim, sim:SCRIPT or recording:FILE, with @2 or @max behind the file "
-           "for a speed");
+           "expected sim, sim:SCRIPT, recording:FILE (with @2 or @max behind the file for a "
+           "speed), hidraw or hidraw:NODE");
 }
 
-std::shared_ptr<PlayedDevice> makeDevice(const DeviceChoice& choice, const DeviceWishes& wishes,
-                                         Streams& streams) {
+Host::SurfaceMatch matchOption(const Arguments& arguments) {
+    std::vector<Host::SurfaceMatch::Ids> named;
+    for (const std::string& text : arguments.values(kMatchOption.name)) {
+        try {
+            named.push_back(Host::SurfaceMatch::Ids::fromText(text));
+        } catch (const std::invalid_argument& error) {
+            throw UsageError(std::string(kMatchOption.name) + ": " + error.what());
+        }
+    }
+    return Host::SurfaceMatch(std::move(named));
+}
+
+Host::SurfaceMatch matchOption(const Arguments& arguments, const DeviceChoice& choice) {
+    if (arguments.given(kMatchOption.name) &&
+        (choice.kind != DeviceChoice::Kind::Hidraw || !choice.path.empty())) {
+        throw UsageError(std::string(kMatchOption.name) + " goes with --device hidraw");
+    }
+    return matchOption(arguments);
+}
+
+std::shared_ptr<ObservedDevice> makeDevice(const DeviceChoice& choice, const DeviceWishes& wishes,
+                                           Streams& streams) {
     if (choice.kind == DeviceChoice::Kind::Simulated) {
         return makeSurface(choice, wishes, streams);
+    }
+    if (choice.kind == DeviceChoice::Kind::Hidraw) {
+        return openSurface(choice, wishes, streams);
     }
     return std::make_shared<RecordedDevice>(readRecording(choice.path, streams).frames,
                                             choice.speed, SurfaceIdentity{}, streams.clock);

@@ -1,6 +1,8 @@
 #pragma once
 
+#include "Host/SurfaceMatch.h"
 #include "Tools/CommandTable.h"
+#include "Tools/ObservedDevice.h"
 #include "Tools/PlayedDevice.h"
 #include "Tools/Streams.h"
 
@@ -13,19 +15,24 @@
 namespace VexaTouch::Tools {
 
 /// A device as it is named on the command line: "sim", "sim:SCRIPT", "recording:FILE",
-/// "recording:FILE@2" or "recording:FILE@max". SCRIPT and FILE may be "-", standard input.
+/// "recording:FILE@2", "recording:FILE@max", "hidraw" or "hidraw:NODE". SCRIPT and FILE may be "-",
+/// standard input.
 ///
 /// What stands behind the last @ is a speed if it is "max" or reads as a number, otherwise it
 /// belongs to the file's name: for a file named "a@2" write "a@2@1".
 struct DeviceChoice {
-    enum class Kind : std::uint8_t { Simulated, Recording };
+    enum class Kind : std::uint8_t { Simulated, Recording, Hidraw };
 
     Kind kind = Kind::Simulated;
-    std::string path;    ///< of the script or recording; empty: random gestures
+    /// Of the script, recording or node; empty: random gestures, or the first surface there is.
+    std::string path;
     double speed = 1.0;  ///< of a recording; infinity for "max"
 
     /// Throws UsageError, which names `option`.
     static DeviceChoice parse(std::string_view text, std::string_view option = "--device");
+
+    /// Whether it plays something that comes to an end.
+    [[nodiscard]] bool ends() const noexcept { return kind != Kind::Hidraw && !path.empty(); }
 
     friend bool operator==(const DeviceChoice&, const DeviceChoice&) = default;
 };
@@ -39,13 +46,16 @@ struct DeviceWishes {
     /// Writes "simulated surface: random gestures, seed N" to the error stream, so that the session
     /// can be played again.
     bool announceSeed = true;
+    /// Which devices are surfaces, for a hidraw device that is not named by its node.
+    Host::SurfaceMatch match = {};
 };
 
 /// Help of the option --device for the command table.
 inline constexpr std::string_view kDeviceHelp =
     "The device: sim plays random gestures, sim:SCRIPT those of a script, recording:FILE the "
     "reports of a recording at their recorded times; recording:FILE@2 plays twice as fast, "
-    "recording:FILE@max as fast as the reports are taken";
+    "recording:FILE@max as fast as the reports are taken; hidraw is the first surface that is "
+    "plugged in, hidraw:NODE the device of a node such as /dev/hidraw0";
 
 /// Options of subcommands that have a device.
 inline constexpr OptionEntry kDeviceOption = {.name = "--device",
@@ -53,17 +63,30 @@ inline constexpr OptionEntry kDeviceOption = {.name = "--device",
                                               .help = kDeviceHelp,
                                               .defaultValue = "sim",
                                               .kind = ValueKind::Choice,
-                                              .choices = "sim sim: recording:"};
+                                              .choices = "sim sim: recording: hidraw hidraw:"};
+inline constexpr OptionEntry kMatchOption = {
+    .name = "--match",
+    .valueName = "VENDOR:PRODUCT",
+    .help =
+        "Take devices with these ids (hexadecimal, as in 5658:5454) for surfaces as well, "
+        "whatever their reports",
+    .repeatable = true};
 inline constexpr OptionEntry kSeedOption = {
     .name = "--seed", .valueName = "N", .help = "Seed of the simulated surface's random numbers"};
 
-/// Makes the device; its waiting is by the streams' clock. Throws Failure when a file cannot be
-/// read.
-std::shared_ptr<PlayedDevice> makeDevice(const DeviceChoice& choice, const DeviceWishes& wishes,
-                                         Streams& streams);
+/// The rule that --match and the descriptor's make. Throws UsageError.
+Host::SurfaceMatch matchOption(const Arguments& arguments);
+/// The same for a command that has a device; --match is only for a surface that is looked for.
+/// Throws UsageError.
+Host::SurfaceMatch matchOption(const Arguments& arguments, const DeviceChoice& choice);
 
-/// The frames alone: those of a script over and over (numbers and clocks go on), those of a
-/// recording once. There must be a path. Throws Failure when it cannot be read.
+/// Makes the device; a played one waits by the streams' clock. Throws Failure when a file cannot be
+/// read, or when there is no surface or it cannot be opened.
+std::shared_ptr<ObservedDevice> makeDevice(const DeviceChoice& choice, const DeviceWishes& wishes,
+                                           Streams& streams);
+
+/// The frames of a played device alone: those of a script over and over (numbers and clocks go on),
+/// those of a recording once. There must be a path. Throws Failure when it cannot be read.
 PlayedDevice::FrameSource frameSource(const DeviceChoice& choice, Streams& streams);
 
 }  // namespace VexaTouch::Tools

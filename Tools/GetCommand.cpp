@@ -26,10 +26,11 @@ constexpr std::array<PositionalEntry, 1> kPositionals = {{
      .repeatable = true},
 }};
 
-constexpr std::array<OptionEntry, 4> kOptions = {{
+constexpr std::array<OptionEntry, 5> kOptions = {{
     {.name = "--all", .help = "All that the service tells for diagnosis"},
     {.name = "--json", .help = "Print one JSON object with a member for each key"},
     kDeviceOption,
+    kMatchOption,
     kSeedOption,
 }};
 
@@ -123,9 +124,10 @@ int runGet(const Arguments& arguments, Streams& streams) {
     const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
     DeviceWishes wishes{.announceSeed = false};
     wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
+    wishes.match = matchOption(arguments, choice);
     HostedDevice hosted(makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {});
     hosted.begin();
-    if (!choice.path.empty()) {
+    if (choice.ends()) {
         hosted.waitUntilPlayed();
     }
     const Properties properties =

@@ -5,13 +5,14 @@
 
 namespace VexaTouch::Tools {
 
-HostedDevice::HostedDevice(std::shared_ptr<PlayedDevice> device, Host::HostSession::EventSink sink)
+HostedDevice::HostedDevice(std::shared_ptr<ObservedDevice> device,
+                           Host::HostSession::EventSink sink)
     : device_(std::move(device)),
       registration_(device_),
       library_(Host::PluginLibrary::loadDefault()),
       session_(library_, registration_.service(), std::move(sink)) {}
 
-void HostedDevice::begin(PlayedHooks hooks) {
+void HostedDevice::begin(DeviceHooks hooks) {
     hooks.onStateFrame = [this](const std::string& key, const Vexa::PropertyValue& value) {
         session_.setProperty("Pipeline." + key, value);
     };

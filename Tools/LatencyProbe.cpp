@@ -29,7 +29,7 @@ LatencyProbe::LatencyProbe(std::size_t reports, bool mayBeRealTime)
     listener_.emplace([this](std::uint32_t code, Vexa::TraceListener::Arguments) { passed(code); });
 }
 
-PlayedHooks LatencyProbe::hooks() {
+DeviceHooks LatencyProbe::hooks() {
     return {.onSend = [this](std::span<const std::uint8_t> report) { sending(report); },
             .onHandled = [this] { handled(); }};
 }

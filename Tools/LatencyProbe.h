@@ -52,7 +52,7 @@ public:
     LatencyProbe& operator=(LatencyProbe&&) = delete;
 
     /// Those of the device.
-    [[nodiscard]] PlayedHooks hooks();
+    [[nodiscard]] DeviceHooks hooks();
     /// An event is delivered. On the queue's thread.
     void delivered(const Vexa::HidEvent& event) noexcept;
 

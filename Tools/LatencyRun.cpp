@@ -172,7 +172,7 @@ std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options) {
     listening.store(&probe);
     const ReaderTurns turns(options);
     RecordingReader reader(hosted.session());
-    PlayedHooks hooks = probe.hooks();
+    DeviceHooks hooks = probe.hooks();
     hooks.onSend = [&, send = hooks.onSend,
                     next = std::size_t{0}](std::span<const std::uint8_t> report) mutable {
         if (turns.changes(next)) {

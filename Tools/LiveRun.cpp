@@ -35,7 +35,7 @@ std::string microseconds(double ns) {
 
 }  // namespace
 
-LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<PlayedDevice>& device,
+LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<ObservedDevice>& device,
                  LiveRunOptions options, SignalWatch& signals, const WakeUp& wake, Streams& streams)
     : device_(device),
       options_(std::move(options)),
@@ -70,7 +70,7 @@ LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<Playe
 LiveRun::~LiveRun() = default;
 
 void LiveRun::installHooks() {
-    PlayedHooks hooks;
+    DeviceHooks hooks;
     hooks.onStateFrame = [this](const std::string& key, const Vexa::PropertyValue& value) {
         session_.setProperty(std::string(kPipelineDomain) + key, value);
         if (surface_) {
@@ -84,6 +84,11 @@ void LiveRun::installHooks() {
     hooks.onUnplugged = [this] {
         unplugged_ = true;
         wake_.notify();
+    };
+    hooks.onArrived = [this](std::span<const std::uint8_t> report) {
+        if (gaps_.see(report)) {
+            wake_.notify();
+        }
     };
     if (surface_) {
         hooks.onSend = [this](std::span<const std::uint8_t> report) { surface_->report(report); };
@@ -115,8 +120,10 @@ void LiveRun::run() {
     if (!options_.recordFile.empty()) {
         writeRecording();
     }
+    // The service knows it until it ends.
+    const std::string gaps = gaps_.gaps() > 0 ? "; " + gapsText() : std::string();
     session_.end();
-    printSummary();
+    printSummary(gaps);
     if (unplugged_) {
         throw Failure("the device was unplugged");
     }
@@ -128,12 +135,18 @@ bool LiveRun::isOver() const {
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
 
-void LiveRun::waitForWork() const {
+void LiveRun::waitForWork() {
     std::optional<Time> until = deadline_;
+    const auto noLaterThan = [&until](Time time) { until = until ? std::min(*until, time) : time; };
     if (screen_) {
-        until = until ? std::min(*until, nextDraw_) : nextDraw_;
+        noLaterThan(nextDraw_);
     }
-    wake_.wait(until);
+    if (nextGapTime_ && gaps_.gaps() != gapsTold_) {
+        noLaterThan(*nextGapTime_);
+    }
+    if (wake_.wait(until, device_->hangUpDescriptor())) {
+        unplugged_ = true;
+    }
 }
 
 void LiveRun::handleWork() {
@@ -144,7 +157,26 @@ void LiveRun::handleWork() {
     } else {
         tellOfKeyboard();
     }
+    tellOfGaps();
     writeRecordingOnWish();
+}
+
+void LiveRun::tellOfGaps() {
+    const Time now = std::chrono::steady_clock::now();
+    const std::uint64_t gaps = gaps_.gaps();
+    // The picture would be torn by a line; there is the summary.
+    if (gaps == gapsTold_ || screen_ || (nextGapTime_ && now < *nextGapTime_)) {
+        return;
+    }
+    gapsTold_ = gaps;
+    nextGapTime_ = now + std::chrono::seconds(1);
+    streams_.error << "vexatouch run: so far " << gapsText() << std::endl;
+}
+
+std::string LiveRun::gapsText() const {
+    const Vexa::PropertyValue found = session_.property("DisjointImageCount");
+    return counted(found.asUnsigned().value_or(gaps_.gaps()), "gap") + ", " +
+           counted(gaps_.framesLost(), "frame") + " lost";
 }
 
 void LiveRun::takeEvents() {
@@ -241,9 +273,8 @@ void LiveRun::writeRecording() {
     }
 }
 
-void LiveRun::printSummary() const {
-    streams_.error << counted(device_->sent(), "report") << " sent, " << device_->dropped()
-                   << " dropped, " << counted(totals_.events, "event");
+void LiveRun::printSummary(const std::string& gaps) const {
+    streams_.error << device_->tally() << ", " << counted(totals_.events, "event");
     if (totals_.events > 0) {
         streams_.error << "; latency "
                        << microseconds(static_cast<double>(totals_.latencySumNs) /
@@ -251,7 +282,7 @@ void LiveRun::printSummary() const {
                        << " on average, "
                        << microseconds(static_cast<double>(totals_.latencyMostNs)) << " at most";
     }
-    streams_.error << '\n';
+    streams_.error << gaps << '\n';
 }
 
 }  // namespace VexaTouch::Tools

@@ -8,9 +8,10 @@
 #include "Platform/DeviceBackend.h"
 #include "Tools/DeliveredEvent.h"
 #include "Tools/EventInbox.h"
+#include "Tools/FrameGaps.h"
 #include "Tools/LiveScreen.h"
 #include "Tools/LiveSurface.h"
-#include "Tools/PlayedDevice.h"
+#include "Tools/ObservedDevice.h"
 #include "Tools/SettingKeys.h"
 #include "Tools/SignalWatch.h"
 #include "Tools/Streams.h"
@@ -44,7 +45,8 @@ struct LiveRunOptions {
 };
 
 /// A service run by a host from its first step to its last: a plug-in, a device and somebody who
-/// looks at the events. It ends when the device has played everything or is gone, after a time,
+/// looks at the events. Says when frames of the device were lost, at most once a second, and how
+/// many in the end. It ends when the device has played everything or is gone, after a time,
 /// after a number of events, at a signal, or when nobody takes the events any more.
 ///
 /// The thread that runs it prints, draws and writes; the input thread and the device's player only
@@ -55,7 +57,7 @@ public:
     /// Walks the plug-in's life up to its event callback and gives it the settings. `signals` and
     /// `wake` belong together. Everything given must outlive the run. Throws HostFailure and
     /// Failure.
-    LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<PlayedDevice>& device,
+    LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<ObservedDevice>& device,
             LiveRunOptions options, SignalWatch& signals, const WakeUp& wake, Streams& streams);
     ~LiveRun();
     LiveRun(const LiveRun&) = delete;
@@ -77,18 +79,22 @@ private:
 
     void installHooks();
     [[nodiscard]] bool isOver() const;
-    void waitForWork() const;
+    void waitForWork();
     void handleWork();
     void takeEvents();
     void print(const DeliveredEvent& event);
     void handleKeys();
     void draw(bool anyway);
     void tellOfKeyboard() const;
+    void tellOfGaps();
     void writeRecordingOnWish();
     void writeRecording();
-    void printSummary() const;
+    /// Gaps that the service has found in the frame numbers, and what was lost in them: "2 gaps, 14
+    /// frames lost".
+    [[nodiscard]] std::string gapsText() const;
+    void printSummary(const std::string& gaps) const;
 
-    std::shared_ptr<PlayedDevice> device_;
+    std::shared_ptr<ObservedDevice> device_;
     LiveRunOptions options_;
     SignalWatch& signals_;
     const WakeUp& wake_;
@@ -100,6 +106,9 @@ private:
     std::deque<std::string> newest_;  // events under the picture
     bool eventsChanged_ = false;
     Totals totals_;
+    FrameGaps gaps_;
+    std::uint64_t gapsTold_ = 0;
+    std::optional<Time> nextGapTime_;  // not before this is there a further line
     std::optional<Time> deadline_;
     Time nextDraw_;
     bool quit_ = false;

@@ -273,7 +273,7 @@ PlayedDevice::~PlayedDevice() {
     close(0);
 }
 
-void PlayedDevice::setHooks(PlayedHooks hooks) {
+void PlayedDevice::setHooks(DeviceHooks hooks) {
     hooks_ = std::move(hooks);
 }
 
@@ -334,6 +334,18 @@ Vexa::PropertyValue PlayedDevice::property(const Vexa::PropertyValue& key) noexc
 bool PlayedDevice::setProperty(const Vexa::PropertyValue& key,
                                const Vexa::PropertyValue& value) noexcept {
     return answers_.setProperty(key, value);
+}
+
+void PlayedDevice::reportArrived(std::span<const std::uint8_t> report) noexcept {
+    if (hooks_.onArrived) {
+        hooks_.onArrived(report);
+    }
+}
+
+std::string PlayedDevice::tally() const {
+    const std::uint64_t reports = sent();
+    return std::to_string(reports) + (reports == 1 ? " report" : " reports") + " sent, " +
+           std::to_string(dropped()) + " dropped";
 }
 
 void PlayedDevice::reportHandled() noexcept {

@@ -1,11 +1,11 @@
 #pragma once
 
 #include "Pipeline/PipelineRecording.h"
-#include "Platform/DeviceBackend.h"
 #include "Platform/HostClock.h"
 #include "Platform/Mutex.h"
 #include "Platform/ThreadAnnotations.h"
 #include "Tools/FileDescriptor.h"
+#include "Tools/ObservedDevice.h"
 #include "Tools/SurfaceAnswers.h"
 
 #include <atomic>
@@ -33,25 +33,6 @@ struct PlayedPace {
     static constexpr std::uint64_t kBacklog = 64;
 };
 
-/// What somebody wants to hear of a played device. None may throw, or open or close the device;
-/// all are optional.
-struct PlayedHooks {
-    /// A state frame, at its place: all earlier reports have been handled, later ones leave when
-    /// this returns. `key` is the recorded one ("Algs.HoldTimeoutMilliseconds": no "Pipeline").
-    /// Without it state frames are passed over. On the player's thread.
-    std::function<void(const std::string& key, const Vexa::PropertyValue& value)> onStateFrame = {};
-    /// Everything was played and handled; once for each opening that gets so far. On the player's
-    /// thread.
-    std::function<void()> onFinished = {};
-    /// A report is about to leave; the last moment before. Not for one that is dropped because of
-    /// the backlog. On the player's thread.
-    std::function<void(std::span<const std::uint8_t> report)> onSend = {};
-    /// The service is done with a report. On its input thread; must not block.
-    std::function<void()> onHandled = {};
-    /// The plug was pulled while the device was open. On the thread that did it.
-    std::function<void()> onUnplugged = {};
-};
-
 /// A device that plays frames: reports go out through a socket pair whose other end the service
 /// reads, state frames to a hook. Playing starts with each opening, from the first frame, on a
 /// thread of its own, and stops at once when the device is closed, unplugged or destroyed. After
@@ -63,7 +44,7 @@ struct PlayedHooks {
 ///
 /// Reports count as handled by reportHandled; reports that a closed device had left over do not
 /// count for the next opening.
-class PlayedDevice : public Vexa::DeviceBackend {
+class PlayedDevice : public ObservedDevice {
 public:
     using Frame = PipelineRecording::Frame;
     /// Takes the next frame, waits until it is its turn and sends it. Throws to end the playing:
@@ -84,8 +65,7 @@ public:
     PlayedDevice& operator=(const PlayedDevice&) = delete;
     PlayedDevice& operator=(PlayedDevice&&) = delete;
 
-    /// While the device is closed, and no report is being handled.
-    void setHooks(PlayedHooks hooks);
+    void setHooks(DeviceHooks hooks) override;
     /// While the device is closed: of its next openings.
     void setPace(const PlayedPace& pace);
 
@@ -99,7 +79,9 @@ public:
     Vexa::PropertyValue property(const Vexa::PropertyValue& key) noexcept override;
     bool setProperty(const Vexa::PropertyValue& key,
                      const Vexa::PropertyValue& value) noexcept override;
+    void reportArrived(std::span<const std::uint8_t> report) noexcept override;
     void reportHandled() noexcept override;
+    [[nodiscard]] std::string tally() const override;
 
     /// Pulls the plug: the reader finds the socket hung up once it has read what is in it. Any
     /// thread, hooks too. The device can be closed and opened again.
@@ -121,7 +103,7 @@ private:
     PlayedPace pace_;
     Vexa::HostClock& clock_;
     SurfaceAnswers answers_;
-    PlayedHooks hooks_;
+    DeviceHooks hooks_;
 
     std::atomic<std::uint64_t> sent_{0};
     std::atomic<std::uint64_t> dropped_{0};

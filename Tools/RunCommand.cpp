@@ -24,8 +24,9 @@
 namespace VexaTouch::Tools {
 namespace {
 
-constexpr std::array<OptionEntry, 14> kOptions = {{
+constexpr std::array<OptionEntry, 15> kOptions = {{
     kDeviceOption,
+    kMatchOption,
     {.name = "--set",
      .valueName = "KEY=VALUE",
      .help = "Give the service a setting before it is scheduled; the value is JSON. Settings of a "
@@ -73,10 +74,11 @@ constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
     {kExitUsage, "the command line is wrong, an unknown setting included"},
 }};
 
-constexpr std::array<ExampleEntry, 6> kExamples = {{
+constexpr std::array<ExampleEntry, 7> kExamples = {{
     {"vexatouch run --show", "Plays random gestures and draws the surface until q or Ctrl-C"},
     {"vexatouch run --device sim:Examples/taps.gesture",
      "Plays a script of gestures in real time and prints what the service makes of it"},
+    {"vexatouch run --device hidraw", "Runs the surface that is plugged in"},
     {"vexatouch run --device recording:session.json@max --json",
      "Sends a recording through the service as fast as it goes"},
     {"vexatouch run --set HoldTimeoutMilliseconds=300 --duration 10s --record try.json",
@@ -92,7 +94,7 @@ constexpr std::string_view kDescription =
     "does: probe, start, schedule, open, events as they are delivered, and all of it back again. "
     "Each event comes with its host time since the start, its latency from the taking up of the "
     "report that caused it to the host's callback, its kind and its region. A summary follows on "
-    "standard error.\n"
+    "standard error; frames that are missing, by their numbers, are told of at once as well.\n"
     "\n"
     "The run ends when the device has played everything, after --duration or --count, when nobody "
     "reads the events any more, and at SIGINT, SIGTERM or SIGHUP: in order, with the whole "
@@ -149,6 +151,7 @@ DeviceWishes parseWishes(const Arguments& arguments, const DeviceChoice& choice)
     wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
     wishes.rate = rateOption(arguments, "--rate", kHighestRate);
     wishes.endless = arguments.given("--endless");
+    wishes.match = matchOption(arguments, choice);
     return wishes;
 }
 

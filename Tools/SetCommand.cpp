@@ -24,9 +24,10 @@ constexpr std::array<PositionalEntry, 2> kPositionals = {{
      .kind = ValueKind::Text},
 }};
 
-constexpr std::array<OptionEntry, 3> kOptions = {{
+constexpr std::array<OptionEntry, 4> kOptions = {{
     {.name = "--json", .help = "Print a JSON object with the key and its value"},
     kDeviceOption,
+    kMatchOption,
     kSeedOption,
 }};
 
@@ -83,6 +84,7 @@ int runSet(const Arguments& arguments, Streams& streams) {
     const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
     DeviceWishes wishes{.announceSeed = false};
     wishes.seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
+    wishes.match = matchOption(arguments, choice);
     HostedDevice hosted(makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {});
     hosted.begin();
     if (!hosted.session().setProperty(key, value)) {

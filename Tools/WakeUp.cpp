@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstdint>
 #include <cstring>
@@ -27,8 +28,10 @@ void WakeUp::notify() const noexcept {
     static_cast<void>(::write(event_.get(), &one, sizeof one) == sizeof one);
 }
 
-void WakeUp::wait(std::optional<Time> until) const noexcept {
-    pollfd waiting{.fd = event_.get(), .events = POLLIN, .revents = 0};
+bool WakeUp::wait(std::optional<Time> until, int hangUp) const noexcept {
+    // A negative descriptor is passed over.
+    std::array<pollfd, 2> waiting = {{{.fd = event_.get(), .events = POLLIN, .revents = 0},
+                                      {.fd = hangUp, .events = 0, .revents = 0}}};
     timespec left{};
     if (until) {
         const auto ns = std::max(std::chrono::nanoseconds::zero(),
@@ -37,10 +40,14 @@ void WakeUp::wait(std::optional<Time> until) const noexcept {
         const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(ns);
         left = {.tv_sec = seconds.count(), .tv_nsec = (ns - seconds).count()};
     }
-    if (ppoll(&waiting, 1, until ? &left : nullptr, nullptr) > 0) {
+    if (ppoll(waiting.data(), waiting.size(), until ? &left : nullptr, nullptr) <= 0) {
+        return false;
+    }
+    if (waiting[0].revents != 0) {
         std::uint64_t count = 0;
         static_cast<void>(::read(event_.get(), &count, sizeof count) == sizeof count);
     }
+    return (waiting[1].revents & (POLLHUP | POLLERR)) != 0;
 }
 
 }  // namespace VexaTouch::Tools

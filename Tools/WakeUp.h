@@ -17,8 +17,10 @@ public:
 
     /// Ends the waiting that is on or the next one. Any thread; never blocks.
     void notify() const noexcept;
-    /// Waits until notified, at most until that time. The waiting thread.
-    void wait(std::optional<Time> until) const noexcept;
+    /// Waits until notified, at most until that time, or until the other descriptor (-1: none)
+    /// hangs up. Whether it has. The waiting thread.
+    // NOLINTNEXTLINE(modernize-use-nodiscard): who gives no descriptor need not look
+    bool wait(std::optional<Time> until, int hangUp = -1) const noexcept;
 
 private:
     FileDescriptor event_;

@@ -63,7 +63,7 @@ public:
 
     /// `hooks` are called besides the reader's own.
     explicit DeviceReader(const std::shared_ptr<Tools::PlayedDevice>& played,
-                          Tools::PlayedHooks hooks = {})
+                          Tools::DeviceHooks hooks = {})
         : registration_(played), device_(Vexa::HidDevice::create(registration_.service())) {
         hooks.onStateFrame = [this, also = std::move(hooks.onStateFrame)](
                                  const std::string& key, const Vexa::PropertyValue& value) {

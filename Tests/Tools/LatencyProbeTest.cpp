@@ -49,7 +49,7 @@ public:
 
 private:
     LatencyProbe& probe_;
-    PlayedHooks hooks_;
+    DeviceHooks hooks_;
 };
 
 TEST(LatencyProbeTest, AReportIsMeasuredAtEachStage) {

@@ -120,7 +120,7 @@ TEST(RecordedDeviceTest, AStateFrameWaitsForEarlierReportsAndHoldsUpLaterOnes) {
     }
     const auto device = std::make_shared<RecordedDevice>(frames, kMax);
     std::vector<std::pair<std::uint64_t, std::uint64_t>> counts;
-    PlayedHooks hooks;
+    DeviceHooks hooks;
     hooks.onStateFrame = [&](const std::string&, const Vexa::PropertyValue&) {
         counts.emplace_back(device->sent(), device->handled());
     };
@@ -149,7 +149,7 @@ std::vector<std::uint64_t> departures(const FrameList& frames, double speed) {
     FakeHostClock clock;
     clock.ticks = 77'000'000;
     std::vector<std::uint64_t> times;
-    PlayedHooks hooks;
+    DeviceHooks hooks;
     hooks.onSend = [&](auto) { times.push_back(clock.ticks / 1'000'000 - 77); };
     DeviceReader reader(std::make_shared<RecordedDevice>(frames, speed, SurfaceIdentity{}, clock),
                         hooks);
@@ -187,7 +187,7 @@ TEST(RecordedDeviceTest, ARecordingWithoutFramesIsOverAtOnce) {
 TEST(RecordedDeviceTest, FinishedMeansHandledAndTheDeviceStaysPluggedIn) {
     const auto device = std::make_shared<RecordedDevice>(mixedSession().frames(), kMax);
     std::uint64_t handled = 0;
-    PlayedHooks hooks;
+    DeviceHooks hooks;
     hooks.onFinished = [&] { handled = device->handled(); };
     DeviceReader reader(device, hooks);
     reader.open();

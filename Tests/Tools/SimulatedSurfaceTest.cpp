@@ -57,7 +57,7 @@ std::vector<std::vector<std::uint8_t>> images(std::size_t count) {
 class Departures {
 public:
     explicit Departures(FakeHostClock& clock) : clock_(clock) {}
-    [[nodiscard]] PlayedHooks hooks() {
+    [[nodiscard]] DeviceHooks hooks() {
         return {.onSend = [this](auto) { ticks_.push_back(clock_.ticks); }};
     }
     [[nodiscard]] std::vector<std::uint64_t> milliseconds() const {
@@ -306,7 +306,7 @@ TEST(SimulatedSurfaceTest, UnplugsAtAnyMomentFromItsOwnThread) {
         SimulatedPlay play = inOneGo(kGestures);
         play.endless = true;
         const auto surface = std::make_shared<SimulatedSurface>(play);
-        PlayedHooks hooks;
+        DeviceHooks hooks;
         hooks.onSend = [&surface = *surface, count = std::uint64_t{0}, last](auto) mutable {
             if (++count == last) surface.unplug();
         };
@@ -331,7 +331,7 @@ TEST(SimulatedSurfaceTest, OpensOnceAtATime) {
 
 TEST(SimulatedSurfaceTest, ReportsCanBeWatchedAsTheyLeave) {
     ReportTap tap;
-    PlayedHooks hooks;
+    DeviceHooks hooks;
     hooks.onSend = [&tap](std::span<const std::uint8_t> report) { tap.put(report); };
     DeviceReader reader(std::make_shared<SimulatedSurface>(inOneGo("idle 200ms")), hooks);
     reader.play();

@@ -1,0 +1,28 @@
+#include "Tools/FrameGaps.h"
+
+#include "Shared/InputReport.h"
+
+#include <utility>
+
+namespace VexaTouch::Tools {
+
+bool FrameGaps::see(std::span<const std::uint8_t> report) noexcept {
+    const auto image = InputReport::Image::parse(report.data(), report.size());
+    if (!image) {
+        return false;
+    }
+    const auto before = std::exchange(last_, image->frameNumber);
+    // 32-bit arithmetic: 0xFFFFFFFF is followed by 0.
+    if (!before || image->frameNumber == *before + 1U) {
+        return false;
+    }
+    constexpr std::uint32_t kHalf = 0x8000'0000U;
+    const std::uint32_t missing = image->frameNumber - *before - 1U;
+    gaps_.fetch_add(1);
+    if (missing < kHalf) {
+        framesLost_.fetch_add(missing);
+    }
+    return true;
+}
+
+}  // namespace VexaTouch::Tools

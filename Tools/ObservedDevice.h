@@ -1,0 +1,48 @@
+#pragma once
+
+#include "Platform/DeviceBackend.h"
+#include "Platform/PropertyValue.h"
+
+#include <cstdint>
+#include <functional>
+#include <span>
+#include <string>
+
+namespace VexaTouch::Tools {
+
+/// What somebody wants to hear of a device. None may throw, or open or close the device; all are
+/// optional.
+struct DeviceHooks {
+    /// A state frame, at its place: all earlier reports have been handled, later ones leave when
+    /// this returns. `key` is the recorded one ("Algs.HoldTimeoutMilliseconds": no "Pipeline").
+    /// Without it state frames are passed over. On the player's thread; played devices only.
+    std::function<void(const std::string& key, const Vexa::PropertyValue& value)> onStateFrame = {};
+    /// Everything was played and handled; once for each opening that gets so far. On the player's
+    /// thread; played devices only.
+    std::function<void()> onFinished = {};
+    /// The first moment at which a report is known: it is about to leave a played device (not for
+    /// one that is dropped because of the backlog; on the player's thread), or was read from a live
+    /// one (on the input thread). Must not block.
+    std::function<void(std::span<const std::uint8_t> report)> onSend = {};
+    /// The service gets a report next. On its input thread; must not block.
+    std::function<void(std::span<const std::uint8_t> report)> onArrived = {};
+    /// The service is done with a report. On its input thread; must not block.
+    std::function<void()> onHandled = {};
+    /// The plug was pulled while the device was open. On the thread that did it; played devices
+    /// only.
+    std::function<void()> onUnplugged = {};
+};
+
+/// A device of a command: one that is played or one that is there.
+class ObservedDevice : public Vexa::DeviceBackend {
+public:
+    /// While the device is closed, and no report is being handled.
+    virtual void setHooks(DeviceHooks hooks) = 0;
+
+    /// When no hook tells of an unplug: poll it for no events, and a hang-up tells. -1: none.
+    [[nodiscard]] virtual int hangUpDescriptor() const noexcept { return -1; }
+    /// What became of the reports of the latest opening: "12 reports sent, 0 dropped".
+    [[nodiscard]] virtual std::string tally() const = 0;
+};
+
+}  // namespace VexaTouch::Tools
