@@ -1,6 +1,7 @@
 #include "Tools/CommandTable.h"
 
 #include "Tools/ConvertCommand.h"
+#include "Tools/DevicesCommand.h"
 #include "Tools/DiffCommand.h"
 #include "Tools/GetCommand.h"
 #include "Tools/InfoCommand.h"
@@ -22,8 +23,9 @@ namespace {
 
 // The order is that of the help text.
 constexpr std::array kCommands = {
-    &runCommand,    &getCommand,  &setCommand,  &keysCommand,    &latencyCommand, &validateCommand,
-    &replayCommand, &infoCommand, &showCommand, &convertCommand, &synthCommand,   &diffCommand,
+    &runCommand,     &devicesCommand,  &getCommand,    &setCommand,  &keysCommand,
+    &latencyCommand, &validateCommand, &replayCommand, &infoCommand, &showCommand,
+    &convertCommand, &synthCommand,    &diffCommand,
 };
 
 }  // namespace

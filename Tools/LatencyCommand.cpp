@@ -24,7 +24,7 @@ constexpr double kHighestRate = 100'000.0;
 /// Bounds the memory of a run: forty bytes a report.
 constexpr std::uint64_t kMostReports = 2'000'000;
 
-constexpr std::array<OptionEntry, 7> kOptions = {{
+constexpr std::array<OptionEntry, 8> kOptions = {{
     {.name = "--rate", .valueName = "HZ", .help = "Reports a second", .defaultValue = "1000"},
     {.name = "--duration",
      .valueName = "TIME",
@@ -35,11 +35,14 @@ constexpr std::array<OptionEntry, 7> kOptions = {{
      .help = "How many reports each measurement takes, instead of a time"},
     {.name = "--device",
      .valueName = "DEVICE",
-     .help = "Whose reports are sent: sim sends short taps, sim:SCRIPT the gestures of a script "
-             "over and over, recording:FILE the reports of a recording once",
+     .help =
+         "Whose reports are sent: sim sends short taps, sim:SCRIPT the gestures of a script "
+         "over and over, recording:FILE the reports of a recording once; hidraw and hidraw:NODE "
+         "are measured as the surface sends them",
      .defaultValue = "sim",
      .kind = ValueKind::Choice,
-     .choices = "sim sim: recording:"},
+     .choices = "sim sim: recording: hidraw hidraw:"},
+    kMatchOption,
     {.name = "--reader",
      .valueName = "MODE",
      .help = "Whether a thread reads \"Recording\" meanwhile, without pause: on, off or both",
@@ -55,12 +58,14 @@ constexpr std::array<OptionEntry, 7> kOptions = {{
     {.name = "--json", .help = "Print one JSON document instead of the table"},
 }};
 
-constexpr std::array<ExampleEntry, 3> kExamples = {{
+constexpr std::array<ExampleEntry, 4> kExamples = {{
     {"vexatouch latency", "Measures all there is, forty seconds long"},
     {"vexatouch latency --priority realtime --duration 60s --json > latency.json",
      "Keeps the figures of a longer measurement"},
     {"vexatouch latency --rate 100 --device sim:Examples/mixed.gesture --reader off",
      "Measures at the surface's own rate; not every report makes an event"},
+    {"vexatouch latency --device hidraw --reader off --count 1000",
+     "Measures the next thousand reports of the surface that is plugged in"},
 }};
 
 constexpr std::string_view kDescription =
@@ -74,6 +79,11 @@ constexpr std::string_view kDescription =
     "begins. The reader, a thread that reads the recording without pause, takes turns with its "
     "absence every half second, so that whatever else the machine does meets both alike. Without "
     "real-time priority, the input thread and the host's queue are put back to the normal policy. "
+    "A live surface sends when it likes: its reports are measured from the moment at which each "
+    "was "
+    "read from the kernel, the recording is as it comes, and a measurement ends with the number of "
+    "reports or after the time, whichever comes first.\n"
+    "\n"
     "The percentiles are exact. A report that makes no event has no sample in the last two rows; "
     "of the short taps that are sent by default, each image makes one.";
 
@@ -124,6 +134,18 @@ Plan planOf(const Arguments& arguments, Streams& streams) {
     const auto realTime = choiceOption(arguments, "--priority", "realtime", "normal");
     plan.realTime = realTime ? std::vector<bool>{*realTime} : std::vector<bool>{true, false};
     const DeviceChoice choice = DeviceChoice::parse(arguments.value("--device"));
+    DeviceWishes wishes;
+    wishes.match = matchOption(arguments, choice);
+    if (choice.kind == DeviceChoice::Kind::Hidraw) {
+        if (arguments.given("--rate")) {
+            throw UsageError("--rate: a live surface has its own");
+        }
+        if (!arguments.given("--count")) {
+            plan.options.longest = durationOption(arguments, "--duration").value();
+        }
+        plan.options.live = makeDevice(choice, wishes, streams);
+        return plan;
+    }
     plan.options.source = choice.path.empty()
                               ? gestureSource(GestureScript::parse(kLatencyGestures), {}, true)
                               : frameSource(choice, streams);
@@ -229,8 +251,13 @@ void printRatio(std::span<const LatencyResult> results, Streams& streams) {
 }
 
 void printTables(const Plan& plan, const Measurements& measurements, Streams& streams) {
-    streams.out << plan.options.reports << " reports, " << formatted("%g", plan.options.rate)
-                << " a second; the recording was full when each measurement began\n";
+    if (plan.options.live) {
+        streams.out << "at most " << plan.options.reports
+                    << " reports of a live surface, from the moment at which each was read\n";
+    } else {
+        streams.out << plan.options.reports << " reports, " << formatted("%g", plan.options.rate)
+                    << " a second; the recording was full when each measurement began\n";
+    }
     for (const std::vector<LatencyResult>& results : measurements) {
         streams.out << '\n';
         printTable(results, streams);
@@ -279,6 +306,8 @@ void printJson(const Plan& plan, const Measurements& measurements, Streams& stre
     std::string text;
     Vexa::JsonWriter writer(text);
     writer.beginObject();
+    writer.key("live");
+    writer.boolean(plan.options.live != nullptr);
     writer.key("rate");
     writer.number(plan.options.rate);
     writer.key("reports");

@@ -1,14 +1,18 @@
 #include "Tools/LatencyRun.h"
 
+#include "Tools/Failure.h"
 #include "Tools/HostedDevice.h"
 #include "Tools/SimulatedSurface.h"
+#include "Tools/WakeUp.h"
 
 #include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <exception>
+#include <functional>
 #include <limits>
 #include <memory>
+#include <optional>
 #include <span>
 #include <thread>
 #include <utility>
@@ -146,7 +150,68 @@ LatencyResult resultOf(const LatencyProbe& probe, const ReaderTurns& turns, bool
 
 }  // namespace
 
-std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options) {
+namespace {
+
+/// A service on a device, the probe that listens to it and the reader of its recording.
+class Measurement {
+public:
+    Measurement(const LatencyRunOptions& options, std::shared_ptr<ObservedDevice> device)
+        : options_(options), hosted_(std::move(device), [this](const Vexa::HidEvent& event) {
+              if (LatencyProbe* probe = listening_.load()) {
+                  probe->delivered(event);
+              }
+          }) {}
+
+    [[nodiscard]] HostedDevice& hosted() noexcept { return hosted_; }
+
+    /// Measures from the beginning of the device until `waitUntilDone` returns; `handled` is called
+    /// with each report that was handled.
+    template <typename Wait>
+    std::vector<LatencyResult> run(const std::function<void()>& handled, Wait&& waitUntilDone) {
+        LatencyProbe probe(options_.reports * (options_.reader == LatencyReader::Turns ? 2 : 1),
+                           options_.mayBeRealTime);
+        listening_.store(&probe);
+        const ReaderTurns turns(options_);
+        RecordingReader reader(hosted_.session());
+        DeviceHooks hooks = probe.hooks();
+        hooks.onSend = [&, send = hooks.onSend,
+                        next = std::size_t{0}](std::span<const std::uint8_t> report) mutable {
+            if (turns.changes(next)) {
+                reader.turn(turns.isOn(next));
+            }
+            ++next;
+            send(report);
+        };
+        if (handled) {
+            hooks.onHandled = [&handled, told = hooks.onHandled] {
+                told();
+                handled();
+            };
+        }
+        hosted_.begin(std::move(hooks));
+        waitUntilDone();
+        reader.finish();
+        hosted_.halt();
+        listening_.store(nullptr);
+        hosted_.end();
+
+        std::vector<LatencyResult> results;
+        if (options_.reader != LatencyReader::On) {
+            results.push_back(resultOf(probe, turns, false, reader));
+        }
+        if (options_.reader != LatencyReader::Off) {
+            results.push_back(resultOf(probe, turns, true, reader));
+        }
+        return results;
+    }
+
+private:
+    const LatencyRunOptions& options_;
+    std::atomic<LatencyProbe*> listening_ = nullptr;
+    HostedDevice hosted_;
+};
+
+std::vector<LatencyResult> measurePlayed(const LatencyRunOptions& options) {
     const PlayedDevice::FrameSource filling =
         gestureSource(GestureScript::parse(kLatencyGestures), {}, true);
     const PlayedDevice::FrameSource* source = &filling;
@@ -155,47 +220,50 @@ std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options) {
         [&](const PlayedDevice::FrameSink& sink) { playFirst(*source, reports, sink); },
         PlayedPace{.speed = std::numeric_limits<double>::infinity()}, SurfaceIdentity{},
         Vexa::HostClock::system());
-    std::atomic<LatencyProbe*> listening = nullptr;
-    HostedDevice hosted(device, [&listening](const Vexa::HidEvent& event) {
-        if (LatencyProbe* probe = listening.load()) {
-            probe->delivered(event);
-        }
-    });
-    hosted.begin();
-    hosted.waitUntilPlayed();
-    hosted.halt();
+    Measurement measurement(options, device);
+    measurement.hosted().begin();
+    measurement.hosted().waitUntilPlayed();
+    measurement.hosted().halt();
 
     source = &options.source;
     reports = options.reports * (options.reader == LatencyReader::Turns ? 2 : 1);
     device->setPace({.rate = options.rate});
-    LatencyProbe probe(reports, options.mayBeRealTime);
-    listening.store(&probe);
-    const ReaderTurns turns(options);
-    RecordingReader reader(hosted.session());
-    DeviceHooks hooks = probe.hooks();
-    hooks.onSend = [&, send = hooks.onSend,
-                    next = std::size_t{0}](std::span<const std::uint8_t> report) mutable {
-        if (turns.changes(next)) {
-            reader.turn(turns.isOn(next));
-        }
-        ++next;
-        send(report);
-    };
-    hosted.begin(std::move(hooks));
-    hosted.waitUntilPlayed();
-    reader.finish();
-    hosted.halt();
-    listening.store(nullptr);
-    hosted.end();
+    return measurement.run({}, [&] { measurement.hosted().waitUntilPlayed(); });
+}
 
-    std::vector<LatencyResult> results;
-    if (options.reader != LatencyReader::On) {
-        results.push_back(resultOf(probe, turns, false, reader));
-    }
-    if (options.reader != LatencyReader::Off) {
-        results.push_back(resultOf(probe, turns, true, reader));
+std::vector<LatencyResult> measureLive(const LatencyRunOptions& options) {
+    const std::size_t parts = options.reader == LatencyReader::Turns ? 2 : 1;
+    const std::size_t wanted = options.reports * parts;
+    Measurement measurement(options, options.live);
+    const WakeUp wake;
+    std::atomic<std::size_t> handled = 0;
+    const auto now = std::chrono::steady_clock::now();
+    const bool isBounded = options.longest < (std::chrono::nanoseconds::max() / 4);
+    const std::optional<WakeUp::Time> until =
+        isBounded ? std::optional(now + options.longest * parts) : std::nullopt;
+    bool unplugged = false;
+    auto results = measurement.run(
+        [&] {
+            if (handled.fetch_add(1) + 1 == wanted) {
+                wake.notify();
+            }
+        },
+        [&] {
+            while (handled.load() < wanted && !unplugged &&
+                   (!until || std::chrono::steady_clock::now() < *until)) {
+                unplugged = wake.wait(until, options.live->hangUpDescriptor());
+            }
+        });
+    if (unplugged) {
+        throw Failure("the device was unplugged");
     }
     return results;
+}
+
+}  // namespace
+
+std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options) {
+    return options.live ? measureLive(options) : measurePlayed(options);
 }
 
 }  // namespace VexaTouch::Tools

@@ -2,11 +2,14 @@
 
 #include "Tools/LatencyProbe.h"
 #include "Tools/LatencySummary.h"
+#include "Tools/ObservedDevice.h"
 #include "Tools/PlayedDevice.h"
 
 #include <array>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <string_view>
 #include <vector>
 
@@ -23,7 +26,12 @@ extern const std::string_view kLatencyGestures;
 enum class LatencyReader : std::uint8_t { Off, On, Turns };
 
 struct LatencyRunOptions {
-    PlayedDevice::FrameSource source;
+    /// Whose reports are measured as they come, from the moment at which each was read. None: the
+    /// reports of `source` are, at their rate.
+    std::shared_ptr<ObservedDevice> live = {};
+    /// When to end with fewer reports of a live device.
+    std::chrono::nanoseconds longest = std::chrono::nanoseconds::max();
+    PlayedDevice::FrameSource source = {};
     double rate = 1000.0;          ///< reports a second
     std::size_t reports = 10'000;  ///< that are measured, of each result
     LatencyReader reader = LatencyReader::Off;
@@ -41,8 +49,8 @@ struct LatencyResult {
 };
 
 /// Runs a service of its own on a device of its own: fills the recording, then sends the reports at
-/// their rate and measures. Two results, the first without the reader, when it takes turns. Throws
-/// HostFailure.
+/// their rate and measures. On a live device it only measures. Two results, the first without the
+/// reader, when it takes turns. Throws HostFailure, and Failure when a live device is unplugged.
 std::vector<LatencyResult> measureLatency(const LatencyRunOptions& options);
 
 }  // namespace VexaTouch::Tools

@@ -1,0 +1,9 @@
+#pragma once
+
+#include "Tools/CommandTable.h"
+
+namespace VexaTouch::Tools {
+
+extern const Command devicesCommand;
+
+}  // namespace VexaTouch::Tools
