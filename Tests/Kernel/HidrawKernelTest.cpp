@@ -161,7 +161,7 @@ TEST(HidrawKernelTest, ReaderThatStallsLosesTheNewestReportsAndCountsAGap) {
     bool isFirst = true;  // the input thread's
     const auto device = std::make_shared<HookedHidraw>(
         nodeOf(surface), [&, goingOn = goOn.get_future().share()](const std::string& moment) {
-            if (moment == "report" && std::exchange(isFirst, false)) {
+            if (moment == "report done" && std::exchange(isFirst, false)) {
                 stalled.set_value();
                 goingOn.wait();
             }

@@ -59,7 +59,8 @@ private:
     std::uint64_t count_ = 0;
 };
 
-/// The back-end, with a hook that hears of each operation before it, and after it as "open done".
+/// The back-end, with a hook that hears of each operation before it, and of two after it: "open
+/// done", "report done".
 class HookedHidraw final : public Vexa::HidrawDevice {
 public:
     using Hook = std::function<void(const std::string& moment)>;
@@ -91,10 +92,10 @@ public:
         hook_("setProperty");
         return HidrawDevice::setProperty(key, value);
     }
-    void reportArrived(std::span<const std::uint8_t> /*report*/) noexcept override {
-        hook_("report");
+    void reportHandled() noexcept override {
+        hook_("report done");
+        handled.add();
     }
-    void reportHandled() noexcept override { handled.add(); }
 
     Counter handled;
 

@@ -79,7 +79,7 @@ INSTANTIATE_TEST_SUITE_P(
     All, UnplugKernelTest,
     ::testing::Values(Stage{"before start", false, false}, Stage{"after start", false, false},
                       Stage{"open", false, false}, Stage{"open done", true, false},
-                      Stage{"after begin", true, false}, Stage{"report", true, false},
+                      Stage{"after begin", true, false}, Stage{"report done", true, false},
                       Stage{"after a report", true, false}, Stage{"getReport", true, false},
                       Stage{"close", true, true}, Stage{"after halt", true, true},
                       Stage{"after end", true, true}, Stage{"never", true, true}),

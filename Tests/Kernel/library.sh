@@ -4,7 +4,12 @@
 folder=$(mktemp -d)
 cd "$folder"
 surface= node=
-trap 'kill $(jobs -p) 2>/dev/null || true' EXIT
+trap 'ended $?' EXIT
+
+ended() {
+    [ "$1" -eq 0 ] || [ "$1" -eq 77 ] || tail -n 8 -v ./*.log status faults 2>/dev/null
+    kill $(jobs -p) 2>/dev/null || true
+}
 
 fail() {
     echo "FAILED: $*"
@@ -59,4 +64,18 @@ read_keys() {
     exec 9<reading
     read -r -t 30 line <&9 || fail "no reader of keys"
     case $line in reading*) ;; *) fail "$line" ;; esac
+}
+
+# The system bus, as Debian configures it, with the policies that are installed.
+start_bus() {
+    mkdir -p /run/dbus
+    dbus-daemon --system --nopidfile
+    export DBUS_SYSTEM_BUS_ADDRESS=unix:path=/run/dbus/system_bus_socket
+}
+
+# as USER COMMAND: by the user's own shell.
+as() {
+    local user=$1
+    shift
+    su -s /usr/bin/sh "$user" -c "$*"
 }
