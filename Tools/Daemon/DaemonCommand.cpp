@@ -124,29 +124,22 @@ std::unique_ptr<Host::SharedKeyboard> makeKeyboard(const Arguments& arguments,
     }
 }
 
-Host::SurfaceMatch parseMatch(const Arguments& arguments) {
-    std::vector<Host::SurfaceMatch::Ids> named;
-    for (const std::string& text : arguments.values("--match")) {
-        try {
-            named.push_back(Host::SurfaceMatch::Ids::fromText(text));
-        } catch (const std::invalid_argument& error) {
-            throw UsageError("--match " + text + ": " + error.what());
-        }
-    }
-    return Host::SurfaceMatch(std::move(named));
-}
-
 std::unique_ptr<Daemon::DeviceSource> makeSource(const Arguments& arguments, Streams& streams) {
     const std::vector<std::string>& devices = arguments.values("--device");
     if (devices.empty()) {
-        return std::make_unique<Daemon::WatchedSource>(parseMatch(arguments));
+        return std::make_unique<Daemon::WatchedSource>(matchOption(arguments));
     }
     if (arguments.given("--match")) {
         throw UsageError("--match is for surfaces that are plugged in, --device for made-up ones");
     }
     auto source = std::make_unique<Daemon::PlayedSource>();
     for (const std::string& text : devices) {
-        source->add(text, makeDevice(DeviceChoice::parse(text), {}, streams));
+        const DeviceChoice choice = DeviceChoice::parse(text);
+        if (choice.kind == DeviceChoice::Kind::Hidraw) {
+            throw UsageError("--device " + text +
+                             ": surfaces that are plugged in are found without --device");
+        }
+        source->add(text, makeDevice(choice, {}, streams));
     }
     return source;
 }

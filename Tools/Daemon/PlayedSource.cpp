@@ -5,7 +5,7 @@
 
 namespace VexaTouch::Tools::Daemon {
 
-void PlayedSource::add(std::string name, std::shared_ptr<PlayedDevice> device) {
+void PlayedSource::add(std::string name, std::shared_ptr<ObservedDevice> device) {
     PluggedSurface surface;
     surface.id = std::to_string(++last_);
     surface.physicalPath = surface.id;
@@ -16,7 +16,7 @@ void PlayedSource::add(std::string name, std::shared_ptr<PlayedDevice> device) {
         surface.serial = *serial;
     }
     surface.useSetter = [device](PluggedSurface::Setter set) {
-        PlayedHooks hooks;
+        DeviceHooks hooks;
         hooks.onStateFrame = std::move(set);
         device->setHooks(std::move(hooks));
     };

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "Tools/Daemon/DeviceSource.h"
-#include "Tools/PlayedDevice.h"
+#include "Tools/ObservedDevice.h"
 
 #include <memory>
 #include <string>
@@ -12,7 +12,7 @@ namespace VexaTouch::Tools::Daemon {
 /// Made-up surfaces that are plugged in from the beginning to the end.
 class PlayedSource final : public DeviceSource {
 public:
-    void add(std::string name, std::shared_ptr<PlayedDevice> device);
+    void add(std::string name, std::shared_ptr<ObservedDevice> device);
 
     [[nodiscard]] int descriptor() const noexcept override { return -1; }
     [[nodiscard]] std::vector<PlugChange> takeChanges() override;
