@@ -36,9 +36,9 @@ Daemon::Daemon(EventLoop& loop, Bus& bus, const Host::PluginLibrary& library, De
       rights_(bus, options_.rights),
       streams_(loop),
       manager_(bus, rights_, [this] { return paths(); }) {
-    takeChanges();
-    // Who sees the name finds everything that was there at start.
+    // Who sees the name finds everything that was there at start, since calls are served later.
     bus_.requestName(BusNames::kService);
+    takeChanges();
     if (source_.descriptor() >= 0) {
         sourceWatch_ =
             loop_.watch(source_.descriptor(), EPOLLIN, [this](std::uint32_t) { takeChanges(); });

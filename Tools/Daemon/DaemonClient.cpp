@@ -77,6 +77,20 @@ std::string DaemonClient::owner() {
     return ask(call, "").readString();
 }
 
+bool DaemonClient::readProperties(Device& device) {
+    BusMessage call = bus_.call(BusNames::kService, device.path, kProperties, "GetAll");
+    call.string(BusNames::kDevice);
+    try {
+        device.properties = bus_.ask(call).readDictionary();
+        return true;
+    } catch (const BusError& error) {
+        if (error.name() == "org.freedesktop.DBus.Error.UnknownObject") {
+            return false;
+        }
+        throw Failure(device.path + ": " + error.what() + " (" + error.name() + ')');
+    }
+}
+
 std::vector<DaemonClient::Device> DaemonClient::devices() {
     BusMessage reply = ask(
         bus_.call(BusNames::kService, BusNames::kManagerPath, BusNames::kManager, "ListDevices"),
@@ -89,11 +103,7 @@ std::vector<DaemonClient::Device> DaemonClient::devices() {
         device.number = numberOf(device.path);
         devices.push_back(std::move(device));
     }
-    for (Device& device : devices) {
-        BusMessage call = bus_.call(BusNames::kService, device.path, kProperties, "GetAll");
-        call.string(BusNames::kDevice);
-        device.properties = ask(call, device.path).readDictionary();
-    }
+    std::erase_if(devices, [this](Device& device) { return !readProperties(device); });
     std::ranges::sort(devices, {}, &Device::number);
     return devices;
 }

@@ -43,6 +43,8 @@ public:
     [[nodiscard]] Bus& bus() noexcept { return bus_; }
 
 private:
+    /// False when it was unplugged meanwhile.
+    bool readProperties(Device& device);
     [[nodiscard]] BusMessage deviceCall(const std::string& path, const char* member) const;
     BusMessage ask(const BusMessage& call, const std::string& what);
 

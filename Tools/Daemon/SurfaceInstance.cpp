@@ -87,6 +87,8 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
 
 SurfaceInstance::~SurfaceInstance() {
     worker_.drain();
+    // Without an end before, what is still running goes while there is somebody to take its events.
+    parts_.reset();
 }
 
 void SurfaceInstance::end(std::function<void()> done) {

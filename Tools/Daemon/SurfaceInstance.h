@@ -70,7 +70,7 @@ public:
     /// before the first report. Everything given must outlive it.
     SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& library, PluggedSurface surface,
                     Settings settings, Hooks hooks);
-    /// Not before end() has called back.
+    /// Once end() has called back; before, only when the loop does not run any more.
     ~SurfaceInstance();
     SurfaceInstance(const SurfaceInstance&) = delete;
     SurfaceInstance(SurfaceInstance&&) = delete;
