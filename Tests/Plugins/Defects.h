@@ -1,5 +1,6 @@
 /* The defects that the sample plug-in can be built with: DEFECT(name, the check that must find it,
- * other checks that it fails as well). CMake builds one plug-in for each line. */
+ * other checks that it fails as well; with a ? those that it fails now and then, when threads meet).
+ * CMake builds one plug-in for each line. */
 #ifndef VEXA_TESTS_PLUGINS_DEFECTS_H
 #define VEXA_TESTS_PLUGINS_DEFECTS_H
 
@@ -23,7 +24,7 @@
     DEFECT(DestroyedEarly, "reference-counts", "reference-threads")                               \
     DEFECT(FactoryKeepsReference, "reference-counts", "reference-threads destroy memory")         \
     DEFECT(UnknownInterfaceAddsReference, "reference-counts", "")                                 \
-    DEFECT(CountsWithoutAtomics, "reference-threads", "")                                         \
+    DEFECT(CountsWithoutAtomics, "reference-threads", "?property-threads")                        \
     DEFECT(ProbeReleasesProperties, "argument-order", "")                                         \
     DEFECT(StartsNeighbour, "argument-order", "destroy-scheduled")                                \
     DEFECT(StartsWithoutDevice, "unknown-service", "")                                            \
@@ -51,7 +52,7 @@
     DEFECT(WrongRefcon, "events", "random-reports late-callback")                                 \
     DEFECT(WrongSender, "events", "random-reports")                                               \
     DEFECT(TakesLateCallback, "late-callback", "")                                                \
-    DEFECT(UnschedulesLate, "unschedule", "unload late-callback")                             \
+    DEFECT(UnschedulesLate, "unschedule", "?unload ?late-callback")                               \
     DEFECT(IgnoresOpenFailure, "device-failures", "unplug")                                       \
     DEFECT(LosesDescriptorOnFailedOpen, "device-failures", "")                                    \
     DEFECT(IgnoresRefusedProperty, "device-failures", "")                                         \
@@ -71,7 +72,7 @@
            "property-values device-failures unplug destroy cycles memory unload")                 \
     DEFECT(LeavesThreadBehind, "leaks", "unplug memory unload")                                   \
     DEFECT(LeaksMemory, "memory", "")                                                             \
-    DEFECT(LingersAfterUnloading, "unload", "memory")
+    DEFECT(LingersAfterUnloading, "unload", "?memory")
 /* clang-format on */
 
 #endif

@@ -105,7 +105,7 @@ TEST_F(HostSeamsTest, APlatformThatDoesNotServeTheHostLoadsNoPlugin) {
     abiServes = false;
     EXPECT_EQ(failureOf([] { const Host::PluginLibrary library(kFile); }), platformFault());
     EXPECT_EQ(askedFor, VEXA_ABI_VERSION);
-    EXPECT_EQ(runCommand({"get", "Version"}),
+    EXPECT_EQ(runCommand({"get", "--device", "sim", "Version"}),
               (CommandResult{1, "", "vexatouch get: " + platformFault() + '\n'}));
     abiServes = true;
     EXPECT_EQ(failureOf([] { const Host::PluginLibrary library(kFile); }), "nothing");
@@ -147,10 +147,11 @@ TEST_F(HostSeamsTest, ASessionWithoutAThreadForItsQueueSaysSo) {
     const CommandResult run = runCommand({"run"});
     EXPECT_EQ(run.exitCode, 1);
     EXPECT_THAT(run.error, EndsWith("\nvexatouch run: " + fault + '\n'));
-    EXPECT_EQ(runCommand({"get", "Version"}),
+    EXPECT_EQ(runCommand({"get", "--device", "sim", "Version"}),
               (CommandResult{1, "", "vexatouch get: " + fault + '\n'}));
     haveQueues = true;
-    EXPECT_EQ(runCommand({"get", "Version"}), (CommandResult{0, "[13,0,0]\n", ""}));
+    EXPECT_EQ(runCommand({"get", "--device", "sim", "Version"}),
+              (CommandResult{0, "[13,0,0]\n", ""}));
 }
 
 TEST_F(HostSeamsTest, ADeviceThatCannotBeRegisteredSaysSo) {
@@ -162,7 +163,7 @@ TEST_F(HostSeamsTest, ADeviceThatCannotBeRegisteredSaysSo) {
     const CommandResult run = runCommand({"run"});
     EXPECT_EQ(run.exitCode, 1);
     EXPECT_THAT(run.error, EndsWith("\nvexatouch run: " + fault + '\n'));
-    EXPECT_EQ(runCommand({"get", "Version"}),
+    EXPECT_EQ(runCommand({"get", "--device", "sim", "Version"}),
               (CommandResult{1, "", "vexatouch get: " + fault + '\n'}));
 }
 

@@ -351,6 +351,13 @@ TEST_P(BrokenPluginTest, FailsTheCheckThatLooksForItsDefect) {
     EXPECT_TRUE(failed.contains(std::string(defect.check))) << result;
     if (!kSanitized) {
         // A sanitizer sees some defects in every check.
+        std::erase_if(expected, [&](const std::string& check) {
+            if (!check.starts_with('?')) {
+                return false;
+            }
+            failed.erase(check.substr(1));
+            return true;
+        });
         EXPECT_EQ(failed, expected) << result;
     }
 }
