@@ -137,7 +137,7 @@ int runMonitor(const Arguments& arguments, Streams& streams) {
         std::string("type='signal',sender='org.freedesktop.DBus',interface='org.freedesktop.DBus',"
                     "member='NameOwnerChanged',arg0='") +
             Daemon::BusNames::kService + '\'',
-        [&](Daemon::BusMessage) { end(); });
+        [&](const Daemon::BusMessage&) { end(); });
     client.bus().attach(loop, end);
     // Tells whether there is a daemon that lets us watch; what it sends is caught already.
     const std::size_t surfaces = client.devices().size();
