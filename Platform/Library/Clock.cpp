@@ -1,4 +1,4 @@
-#include <time.h>
+#include <ctime>
 #include <vexa/clock.h>
 
 extern "C" uint64_t vexa_clock_now(void) noexcept {
