@@ -369,7 +369,8 @@ TEST(ValidateCommandTest, EveryCheckHasADefectThatItMustFind) {
     std::set<std::string_view> checked;
     for (const Defect& defect : kDefects) {
         EXPECT_NE(findPluginCheck(defect.check), nullptr) << defect.name;
-        for (const std::string& other : words(defect.others)) {
+        for (std::string other : words(defect.others)) {
+            other.erase(0, other.starts_with('?') ? 1 : 0);
             EXPECT_NE(findPluginCheck(other), nullptr) << defect.name << ": " << other;
         }
         checked.insert(defect.check);
