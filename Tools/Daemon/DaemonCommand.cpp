@@ -76,7 +76,7 @@ constexpr std::string_view kDescription =
     "\n"
     "On the bus it is org.vexatouch.Touch1: whoever sits at the machine may watch gestures, states "
     "and settings; to change settings and to see raw touches takes root or the group vexatouch. "
-    "vexatouch monitor, get, set, record, stats and devices talk to it.\n"
+    "vexatouch monitor, get, set, record and stats talk to it.\n"
     "\n"
     "Under systemd it says when it is ready, what it serves, and answers the watchdog as long as "
     "the input thread of every surface answers; anywhere else it just runs.";
