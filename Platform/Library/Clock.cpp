@@ -1,5 +1,5 @@
-#include <ctime>
 #include <vexa/clock.h>
+#include <ctime>
 
 extern "C" uint64_t vexa_clock_now(void) noexcept {
     timespec now{};
