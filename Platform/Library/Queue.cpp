@@ -1,45 +1,45 @@
+#include "Platform/Library/EventBase.h"
+#include "Platform/Library/FileDescriptor.h"
 #include "Platform/Library/LiveObjects.h"
 #include "Platform/SignalsBlocked.h"
 
 #include <vexa/queue.h>
 
+#include <event2/event.h>
 #include <pthread.h>
 #include <semaphore.h>
+#include <sys/eventfd.h>
+#include <unistd.h>
 #include <array>
 #include <atomic>
 #include <cerrno>
 #include <cstdint>
 #include <cstring>
+#include <memory>
 #include <new>
 
 namespace {
 
 using Vexa::Library::Counted;
-
-// sem_wait, come what may.
-void waitFor(sem_t& semaphore) noexcept {
-    while (::sem_wait(&semaphore) != 0 && errno == EINTR) {
-    }
-}
+using Vexa::Library::Event;
+using Vexa::Library::EventBase;
+using Vexa::Library::FileDescriptor;
 
 // The queue whose thread this is.
 constinit thread_local const vexa_queue* current = nullptr;
 
 }  // namespace
 
-/// Whoever submits pushes its task on a stack, without a lock that a slower thread could hold; the
-/// queue's thread takes the whole stack and turns it over. The push onto an empty stack wakes the
-/// thread, so there is one wake for each time that it takes the stack, never more.
+/// The queue's thread waits in libevent for a wake. Whoever submits pushes its task on a stack,
+/// without a lock that a slower thread could hold; the thread takes the whole stack and turns it
+/// over. The push onto an empty stack wakes it, so there is one wake for each time that it takes
+/// the stack, never more. The wake is an edge: nothing has to be read to be woken again.
 struct vexa_queue final : private Counted<VEXA_OBJECT_QUEUE> {
 public:
     static vexa_queue* create(const char* label) noexcept {
-        auto* const queue = new (std::nothrow) vexa_queue;
-        if (!queue) return nullptr;
-        if (!queue->start(label)) {
-            delete queue;
-            return nullptr;
-        }
-        return queue;
+        std::unique_ptr<vexa_queue> queue(new (std::nothrow) vexa_queue);
+        if (!queue || !queue->start(label)) return nullptr;
+        return queue.release();
     }
 
     void retain() noexcept { references_.fetch_add(1, std::memory_order_relaxed); }
@@ -71,7 +71,8 @@ public:
         Node node{.task = [](void* context) { ::sem_post(static_cast<sem_t*>(context)); },
                   .context = &done};
         push(node);
-        waitFor(done);
+        while (::sem_wait(&done) != 0 && errno == EINTR) {
+        }
         static_cast<void>(::sem_destroy(&done));
     }
 
@@ -85,10 +86,21 @@ private:
         Node* next = nullptr;
     };
 
-    vexa_queue() noexcept { static_cast<void>(::sem_init(&work_, 0, 0)); }
-    ~vexa_queue() { static_cast<void>(::sem_destroy(&work_)); }
+    friend std::default_delete<vexa_queue>;
 
+    vexa_queue() = default;
+    ~vexa_queue() = default;
+
+    // False: no memory, no descriptors, no thread.
     bool start(const char* label) noexcept {
+        wake_ = FileDescriptor(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK));
+        if (!wake_ || !base_) return false;
+        woken_.reset(event_new(
+            base_.get(), wake_.number(), EV_READ | EV_ET | EV_PERSIST,
+            [](evutil_socket_t, short, void* queue) { static_cast<vexa_queue*>(queue)->serve(); },
+            this));
+        if (!woken_ || event_add(woken_.get(), nullptr) != 0) return false;
+
         if (label) std::strncpy(name_.data(), label, name_.size() - 1);
         const Vexa::SignalsBlocked blocked;
         const auto body = [](void* queue) -> void* {
@@ -104,8 +116,10 @@ private:
             node.next = older;
         } while (!newest_.compare_exchange_weak(older, &node, std::memory_order_release,
                                                 std::memory_order_relaxed));
-        // The node may have run and be gone by now.
-        if (!older) static_cast<void>(::sem_post(&work_));
+        if (older) return;
+        // The node may have run and be gone by now; the queue is not: whoever pushes holds it.
+        const std::uint64_t one = 1;
+        static_cast<void>(::write(wake_.number(), &one, sizeof one));
     }
 
     void work() noexcept {
@@ -113,19 +127,25 @@ private:
         if (name_[0] != '\0') {
             static_cast<void>(pthread_setname_np(pthread_self(), name_.data()));
         }
-        for (;;) {
-            if (!orphaned_) waitFor(work_);
+        static_cast<void>(event_base_loop(base_.get(), 0));
+        if (orphaned_) delete this;
+    }
+
+    // From within `work`, at each wake.
+    void serve() noexcept {
+        bool isOver = false;
+        do {
             Node* task = takeInOrder();
-            // Only an orphan finds nothing: nobody is left who could submit.
-            if (!task) break;
-            while (task) {
-                if (task == &end_) return;
+            // Only an orphan takes again and finds nothing: nobody is left who could submit.
+            isOver = orphaned_ && !task;
+            while (task && !isOver) {
+                isOver = task == &end_;
                 Node* const next = task->next;
-                runOnce(*task);
+                if (!isOver) runOnce(*task);
                 task = next;
             }
-        }
-        delete this;
+        } while (orphaned_ && !isOver);
+        if (isOver) static_cast<void>(event_base_loopbreak(base_.get()));
     }
 
     Node* takeInOrder() noexcept {
@@ -149,7 +169,9 @@ private:
 
     std::atomic<std::uint32_t> references_{1};
     std::atomic<Node*> newest_{nullptr};
-    sem_t work_{};
+    FileDescriptor wake_;
+    EventBase base_{Vexa::Library::makeEventBase()};
+    Event woken_;
     pthread_t thread_{};
     std::array<char, 16> name_{};
     Node end_;

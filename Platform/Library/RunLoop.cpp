@@ -1,5 +1,7 @@
 #include "Platform/Library/RunLoop.h"
 
+#include "Platform/Library/EventBase.h"
+
 #include <vexa/clock.h>
 
 #include <event2/event.h>
@@ -18,7 +20,10 @@
 
 using Vexa::Mutex;
 using Vexa::MutexLock;
+using Vexa::Library::Event;
+using Vexa::Library::EventBase;
 using Vexa::Library::FileDescriptor;
+using Vexa::Library::makeEventBase;
 
 namespace {
 
@@ -27,44 +32,6 @@ struct Task {
     vexa_task drop;
     void* context;
 };
-
-struct FreeBase {
-    void operator()(event_base* base) const noexcept { event_base_free(base); }
-};
-struct FreeConfig {
-    void operator()(event_config* config) const noexcept { event_config_free(config); }
-};
-struct FreeEvent {
-    void operator()(event* freed) const noexcept { event_free(freed); }
-};
-using Base = std::unique_ptr<event_base, FreeBase>;
-using Event = std::unique_ptr<event, FreeEvent>;
-
-// Whether that many descriptors can still be opened.
-template <std::size_t kCount>
-bool canOpen() noexcept {
-    std::array<FileDescriptor, kCount> opened;
-    return std::ranges::all_of(opened, [](FileDescriptor& each) {
-        each = FileDescriptor(::eventfd(0, EFD_CLOEXEC));
-        return static_cast<bool>(each);
-    });
-}
-
-// Null: no memory, no descriptors.
-Base makeBase() noexcept {
-    const std::unique_ptr<event_config, FreeConfig> config(event_config_new());
-    // On epoll whatever the environment says: nothing else tells that a socket's far end closed.
-    if (!config ||
-        event_config_require_features(config.get(), EV_FEATURE_O1 | EV_FEATURE_EARLY_CLOSE) != 0 ||
-        event_config_set_flag(config.get(), EVENT_BASE_FLAG_IGNORE_ENV) != 0 ||
-        event_config_set_flag(config.get(), EVENT_BASE_FLAG_NOLOCK) != 0) {
-        return nullptr;
-    }
-    // An epoll set and a pair of its own for signals. libevent ends the process when it gets the
-    // set and not the pair.
-    if (!canOpen<3>()) return nullptr;
-    return Base(event_base_new_with_config(config.get()));
-}
 
 // What a wait found: the numbers of watches. What has no room shows itself to the next.
 class Ready {
@@ -131,7 +98,7 @@ private:
 struct Vexa::Library::Mode {
     Mutex door{};
     Mutex inside{};
-    Base base{makeBase()};
+    EventBase base{makeEventBase()};
     Watch wake{.number = kWake, .source = nullptr, .mode = this, .event = {}};
     Event timer{};
     Ready* ready GUARDED_BY(inside) = nullptr;

@@ -1,4 +1,5 @@
 #include "Platform/RunLoop.h"
+#include "Tests/Support/FewDescriptors.h"
 
 #include <gmock/gmock.h>
 
@@ -331,18 +332,9 @@ TEST(RunLoop, IsGoneForWhatEndsAfterItInItsThread) {
 TEST(RunLoop, FailsToRunInANewModeWithoutDescriptorsLeft) {
     onThread([] {
         const RunLoop loop = RunLoop::current();
-        rlimit before{};
-        ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &before), 0);
-        const int next = ::dup(STDOUT_FILENO);
-        ASSERT_GE(next, 0);
-        ::close(next);
         for (const rlim_t left : std::to_array<rlim_t>({0, 1, 2})) {
-            rlimit few = before;
-            few.rlim_cur = static_cast<rlim_t>(next) + left;
-            ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &few), 0);
-            const vexa_run_result result = loop.run(kMode, 0);
-            ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
-            EXPECT_EQ(result, VEXA_RUN_FAILED) << left;
+            const VexaTouch::Testing::FewDescriptors few(left);
+            EXPECT_EQ(loop.run(kMode, 0), VEXA_RUN_FAILED) << left;
         }
         EXPECT_EQ(loop.run(kMode, 0), VEXA_RUN_TIMED_OUT);
     });

@@ -1,4 +1,5 @@
 #include "Platform/SerialQueue.h"
+#include "Tests/Support/FewDescriptors.h"
 
 #include <gmock/gmock.h>
 
@@ -207,6 +208,56 @@ TEST(SerialQueue, SharesOneQueueAmongHandles) {
     second.reset();
     EXPECT_TRUE(ran);
     EXPECT_EQ(liveQueues(), before);
+}
+
+// A queue takes four descriptors.
+TEST(SerialQueue, IsNotMadeWithoutDescriptorsLeft) {
+    const std::int64_t before = liveQueues();
+    for (const rlim_t left : std::to_array<rlim_t>({0, 1, 2, 3})) {
+        const VexaTouch::Testing::FewDescriptors few(left);
+        EXPECT_EQ(vexa_queue_create("few"), nullptr) << left;
+    }
+    EXPECT_EQ(liveQueues(), before);
+    const VexaTouch::Testing::FewDescriptors enough(4);
+    vexa_queue* const queue = vexa_queue_create("enough");
+    EXPECT_NE(queue, nullptr);
+    vexa_queue_release(queue);
+}
+
+// Others push while a task lets go of the queue: what they pushed runs before it ends.
+TEST(SerialQueue, RunsWhatCameWhileItsLastTaskLetGo) {
+    for (int round = 0; round < 200; ++round) {
+        const std::int64_t before = liveQueues();
+        vexa_queue* const queue = vexa_queue_create("last");
+        ASSERT_NE(queue, nullptr);
+        std::latch submitted(1);
+        std::atomic<int> ran{0};
+        struct Context {
+            vexa_queue* queue;
+            std::latch* submitted;
+            std::atomic<int>* ran;
+        } context{queue, &submitted, &ran};
+        vexa_queue_retain(queue);
+        ASSERT_TRUE(vexa_queue_submit(
+            queue,
+            [](void* pointer) {
+                const Context& of = *static_cast<Context*>(pointer);
+                of.submitted->wait();
+                vexa_queue_release(of.queue);
+            },
+            &context));
+        for (int i = 0; i < 3; ++i) {
+            ASSERT_TRUE(vexa_queue_submit(
+                queue, [](void* pointer) { ++*static_cast<Context*>(pointer)->ran; }, &context));
+        }
+        // Either of the two may be the last.
+        std::thread([&] {
+            submitted.count_down();
+            vexa_queue_release(queue);
+        }).join();
+        waitForLiveQueues(before);
+        EXPECT_EQ(ran, 3);
+    }
 }
 
 TEST(SerialQueue, TakesNullWhereItMay) {

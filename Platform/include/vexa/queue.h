@@ -11,7 +11,8 @@ typedef void (*vexa_task)(void* context);
 VEXA_BEGIN_C
 
 /* [any] A queue with a thread of its own, named `label` (the first 15 bytes; may be NULL) and with
- * all signals blocked. The caller owns one reference. NULL when there is no memory or no thread.
+ * all signals blocked. The caller owns one reference. NULL when there is no memory, no thread or no
+ * descriptor (it takes four).
  *
  * The end of the process waits for no queue: tasks that have not run by then do not. Who wants them
  * to releases the queue before. */
