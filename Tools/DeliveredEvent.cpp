@@ -20,13 +20,13 @@ double since(std::uint64_t timeNs, std::uint64_t startNs) {
 
 }  // namespace
 
-DeliveredEvent DeliveredEvent::of(const Vexa::HidEvent& event, std::uint64_t nowTicks) {
+DeliveredEvent DeliveredEvent::of(const Vexa::HidEvent& event, std::uint64_t arrivedTicks,
+                                  std::uint64_t nowTicks) {
     DeliveredEvent delivered;
     delivered.record = eventRecordFromHidEvent(event);
-    const std::uint64_t takenUp = event.timestamp();
-    delivered.record.timeNs = Util::nanosecondsFromMachTime(takenUp);
+    delivered.record.timeNs = Util::nanosecondsFromMachTime(event.timestamp());
     delivered.latencyNs =
-        nowTicks > takenUp ? Util::nanosecondsFromMachTime(nowTicks - takenUp) : 0;
+        nowTicks > arrivedTicks ? Util::nanosecondsFromMachTime(nowTicks - arrivedTicks) : 0;
     return delivered;
 }
 

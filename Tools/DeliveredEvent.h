@@ -13,11 +13,13 @@ struct DeliveredEvent {
     /// Its time is the host time at which the service took up the report that caused the event;
     /// index and device clock are unknown to a host, and 0.
     EventRecord record;
-    /// From then to the callback, in nanoseconds.
+    /// From the reading of that report to the callback, in nanoseconds.
     std::uint64_t latencyNs = 0;
 
-    /// The event as it stands when the callback is called at `nowTicks`.
-    static DeliveredEvent of(const Vexa::HidEvent& event, std::uint64_t nowTicks);
+    /// The event as it stands when the callback is called at `nowTicks`, its report having been
+    /// read at `arrivedTicks`.
+    static DeliveredEvent of(const Vexa::HidEvent& event, std::uint64_t arrivedTicks,
+                             std::uint64_t nowTicks);
 };
 
 /// {"time_ns":..,"latency_ns":..,"frame":..,"kind":"..","region":..,"phase":..,"mask":..}, without

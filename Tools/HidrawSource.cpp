@@ -74,13 +74,13 @@ bool HidrawSource::setProperty(const Vexa::PropertyValue& key,
 }
 
 void HidrawSource::reportArrived(std::span<const std::uint8_t> report,
-                                 std::uint64_t /*timestamp*/) noexcept {
+                                 std::uint64_t timestamp) noexcept {
     read_.fetch_add(1);
     if (hooks_.onSend) {
         hooks_.onSend(report);
     }
     if (hooks_.onArrived) {
-        hooks_.onArrived(report);
+        hooks_.onArrived(report, timestamp);
     }
 }
 

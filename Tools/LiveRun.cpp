@@ -48,7 +48,10 @@ LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<Obser
       watch_(*device, streams.patience),
       registration_(Host::registeredDevice(device)),
       session_(library, registration_.service(), [this](const Vexa::HidEvent& event) {
-          const DeliveredEvent delivered = DeliveredEvent::of(event, nowTicks());
+          const std::uint64_t now = nowTicks();
+          const std::uint64_t takenUp = event.timestamp();
+          const DeliveredEvent delivered =
+              DeliveredEvent::of(event, arrivals_.latestUntil(takenUp).value_or(takenUp), now);
           if (keys_) {
               keys_->handle(event);
           }
@@ -87,7 +90,8 @@ void LiveRun::installHooks() {
         unplugged_ = true;
         wake_.notify();
     };
-    hooks.onArrived = [this](std::span<const std::uint8_t> report) {
+    hooks.onArrived = [this](std::span<const std::uint8_t> report, std::uint64_t ticks) {
+        arrivals_.put(ticks);
         if (gaps_.see(report)) {
             wake_.notify();
         }

@@ -6,6 +6,7 @@
 #include "Host/PluginLibrary.h"
 #include "Host/SharedKeyboard.h"
 #include "Platform/DeviceBackend.h"
+#include "Tools/ArrivalTimes.h"
 #include "Tools/DeliveredEvent.h"
 #include "Tools/EventInbox.h"
 #include "Tools/FrameGaps.h"
@@ -104,6 +105,7 @@ private:
     Streams& streams_;
     std::uint64_t startNs_;
     EventInbox inbox_;
+    ArrivalTimes arrivals_;
     std::unique_ptr<LiveSurface> surface_;
     std::unique_ptr<LiveScreen> screen_;
     std::deque<std::string> newest_;  // events under the picture

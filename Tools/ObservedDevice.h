@@ -24,8 +24,9 @@ struct DeviceHooks {
     /// one that is dropped because of the backlog; on the player's thread), or was read from a live
     /// one (on the input thread). Must not block.
     std::function<void(std::span<const std::uint8_t> report)> onSend = {};
-    /// The service gets a report next. On its input thread; must not block.
-    std::function<void(std::span<const std::uint8_t> report)> onArrived = {};
+    /// A report was read, at this host tick, and the service gets it next. On its input thread;
+    /// must not block.
+    std::function<void(std::span<const std::uint8_t> report, std::uint64_t ticks)> onArrived = {};
     /// The service is done with a report. On its input thread; must not block.
     std::function<void()> onHandled = {};
     /// The plug was pulled while the device was open. On the thread that did it; played devices

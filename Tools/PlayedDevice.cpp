@@ -321,9 +321,9 @@ bool PlayedDevice::setProperty(const Vexa::PropertyValue& key,
 }
 
 void PlayedDevice::reportArrived(std::span<const std::uint8_t> report,
-                                 std::uint64_t /*timestamp*/) noexcept {
+                                 std::uint64_t timestamp) noexcept {
     if (hooks_.onArrived) {
-        hooks_.onArrived(report);
+        hooks_.onArrived(report, timestamp);
     }
 }
 

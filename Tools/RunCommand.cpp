@@ -89,7 +89,7 @@ constexpr std::array<ExampleEntry, 7> kExamples = {{
 constexpr std::string_view kDescription =
     "Loads the service plug-in, gives it a device and takes it through its whole life as a host "
     "does: probe, start, schedule, open, events as they are delivered, and all of it back again. "
-    "Each event comes with its host time since the start, its latency from the taking up of the "
+    "Each event comes with its host time since the start, its latency from the reading of the "
     "report that caused it to the host's callback, its kind and its region. A summary follows on "
     "standard error; frames that are missing, by their numbers, are told of at once as well.\n"
     "\n"

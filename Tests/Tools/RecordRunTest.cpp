@@ -70,7 +70,7 @@ protected:
             library, device, std::move(options),
             [&recorded](const Vexa::HidEvent& event) {
                 recorded.events.push_back(
-                    essence(deliveredEventJson(DeliveredEvent::of(event, 0))));
+                    essence(deliveredEventJson(DeliveredEvent::of(event, 0, 0))));
             },
             signals, wake, streams);
         RecordingStream stream(std::move(target), "session.json");

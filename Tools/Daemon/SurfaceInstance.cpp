@@ -143,7 +143,7 @@ void SurfaceInstance::deliver(const Vexa::HidEvent& event) {
     {
         const Vexa::MutexLock guard(lock_);
         if (inbox_.events.size() < kMostGestures) {
-            inbox_.events.push_back(DeliveredEvent::of(event, now));
+            inbox_.events.push_back(DeliveredEvent::of(event, event.timestamp(), now));
             inbox_.hostTimesNs.push_back(Util::nanosecondsFromMachTime(now));
         } else {
             ++inbox_.lost;
