@@ -10,6 +10,7 @@
 #include <algorithm>
 #include <array>
 #include <chrono>
+#include <cmath>
 #include <cstdint>
 #include <cstdio>
 #include <optional>
@@ -84,7 +85,8 @@ constexpr std::string_view kDescription =
     "read from the kernel, the recording is as it comes, and a measurement ends with the number of "
     "reports or after the time, whichever comes first.\n"
     "\n"
-    "The percentiles are exact. A report that makes no event has no sample in the last two rows; "
+    "A percentile is too large by a thousandth at most, the maximum is exact. A report that makes "
+    "no event has no sample in the last two rows; "
     "of the short taps that are sent by default, each image makes one.";
 
 std::optional<bool> choiceOption(const Arguments& arguments, std::string_view name,
@@ -163,6 +165,27 @@ std::string prioritiesText(const LatencyResult& result) {
            priorityText(result.queueThread);
 }
 
+template <typename... Values>
+std::string formatted(const char* format, Values... values) {
+    std::array<char, 256> text{};
+    const int length = std::snprintf(text.data(), text.size(), format, values...);
+    return std::string(text.data(), static_cast<std::size_t>(length));
+}
+
+/// A measurement is silent until it is done.
+void tellHowLong(const LatencyRunOptions& options, bool realTime, Streams& streams) {
+    const int parts = options.reader == LatencyReader::Turns ? 2 : 1;
+    const double seconds = options.live
+                               ? std::chrono::duration<double>(options.longest).count() * parts
+                               : static_cast<double>(options.reports) * parts / options.rate;
+    streams.error << "measuring " << (realTime ? "with real-time" : "at normal") << " priority";
+    constexpr double kLongest = 1e9;  // a live device may have no limit
+    if (seconds < kLongest) {
+        streams.error << formatted(", about %.0f s", std::ceil(seconds));
+    }
+    streams.error << " ..." << std::endl;
+}
+
 /// The results of each priority.
 using Measurements = std::vector<std::vector<LatencyResult>>;
 
@@ -170,6 +193,7 @@ Measurements measure(Plan& plan, Streams& streams) {
     Measurements measurements;
     for (const bool realTime : plan.realTime) {
         plan.options.mayBeRealTime = realTime;
+        tellHowLong(plan.options, realTime, streams);
         const std::vector<LatencyResult>& results =
             measurements.emplace_back(measureLatency(plan.options));
         streams.error << "measured with the " << prioritiesText(results.front()) << '\n';
@@ -196,13 +220,6 @@ constexpr std::array<std::string_view, kFigures.size()> kFigureNames = {
 
 const LatencySummary& toCallback(const LatencyResult& result) {
     return result.stages[static_cast<std::size_t>(LatencyStage::Delivered)];
-}
-
-template <typename... Values>
-std::string formatted(const char* format, Values... values) {
-    std::array<char, 256> text{};
-    const int length = std::snprintf(text.data(), text.size(), format, values...);
-    return std::string(text.data(), static_cast<std::size_t>(length));
 }
 
 double microseconds(std::uint64_t ns) {
