@@ -1,7 +1,7 @@
 #pragma once
 
+#include <fcntl.h>
 #include <sys/resource.h>
-#include <unistd.h>
 #include <cerrno>
 #include <system_error>
 
@@ -12,11 +12,9 @@ namespace VexaTouch::Testing {
 class FewDescriptors {
 public:
     explicit FewDescriptors(rlim_t left) {
-        const int next = ::dup(STDOUT_FILENO);
-        if (next < 0 || ::getrlimit(RLIMIT_NOFILE, &before_) != 0) fail();
-        ::close(next);
+        if (::getrlimit(RLIMIT_NOFILE, &before_) != 0) fail();
         rlimit few = before_;
-        few.rlim_cur = static_cast<rlim_t>(next) + left;
+        few.rlim_cur = firstFreeAfter(left);
         if (::setrlimit(RLIMIT_NOFILE, &few) != 0) fail();
     }
     ~FewDescriptors() { ::setrlimit(RLIMIT_NOFILE, &before_); }
@@ -28,6 +26,15 @@ public:
 private:
     [[noreturn]] static void fail() {
         throw std::system_error(errno, std::generic_category(), "limit of descriptors");
+    }
+
+    // The number of a descriptor that is free, with so many free ones below it.
+    static rlim_t firstFreeAfter(rlim_t left) {
+        for (int number = 0;; ++number) {
+            const bool isFree = ::fcntl(number, F_GETFD) < 0;
+            if (isFree && left == 0) return static_cast<rlim_t>(number);
+            if (isFree) --left;
+        }
     }
 
     rlimit before_{};
