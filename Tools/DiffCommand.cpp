@@ -5,6 +5,7 @@
 #include "Tools/Progress.h"
 #include "Tools/RecordingFile.h"
 #include "Tools/Replay.h"
+#include "Tools/ReplayOptions.h"
 #include "Tools/StateSnapshot.h"
 
 #include <algorithm>
@@ -25,11 +26,7 @@ constexpr std::array<PositionalEntry, 2> kPositionals = {{
      .required = false},
 }};
 
-constexpr std::string_view kSettingChoices =
-    "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= "
-    "EnableTapSuppression= VirtualNormalizationFactors. ResetEventStats=";
-
-constexpr std::array<OptionEntry, 3> kOptions = {{
+constexpr std::array<OptionEntry, 4> kOptions = {{
     {.name = "--set-a",
      .valueName = "KEY=VALUE",
      .help = "Give the replay of A a setting before its first frame, as replay --set does",
@@ -42,6 +39,7 @@ constexpr std::array<OptionEntry, 3> kOptions = {{
      .repeatable = true,
      .kind = ValueKind::Choice,
      .choices = kSettingChoices},
+    kPinOption,
     {.name = "--json", .help = "Print one JSON object"},
 }};
 
@@ -120,8 +118,8 @@ std::string eventsText(std::span<const EventRecord> events) {
 /// Plays one side; the snapshot is that of its last frame.
 class Side {
 public:
-    Side(FrameList frames, std::span<const Setting> settings)
-        : replay_(std::move(frames), settings) {}
+    Side(FrameList frames, ReplaySettings settings)
+        : replay_(std::move(frames), std::move(settings)) {}
 
     /// False when the recording has ended.
     bool advance() {
@@ -135,6 +133,7 @@ public:
 
     [[nodiscard]] std::span<const EventRecord> events() const { return played_->events; }
     [[nodiscard]] const StateSnapshot& snapshot() const noexcept { return snapshot_; }
+    [[nodiscard]] const Replay& replay() const noexcept { return replay_; }
     [[nodiscard]] std::uint64_t frameCount() const noexcept { return replay_.frames().size(); }
 
 private:
@@ -317,8 +316,9 @@ int runDiff(const Arguments& arguments, Streams& streams) {
     RecordingFile fileA = readSide(arguments.value("A"), streams);
     FrameList framesB =
         arguments.given("B") ? readSide(arguments.value("B"), streams).frames : fileA.frames;
-    Side a(std::move(fileA.frames), settingsA);
-    Side b(std::move(framesB), settingsB);
+    const bool pinned = arguments.given(kPinOption.name);
+    Side a(std::move(fileA.frames), {.list = settingsA, .pinned = pinned});
+    Side b(std::move(framesB), {.list = settingsB, .pinned = pinned});
     const Comparison comparison = compare(a, b, comparedFields(settingsA, settingsB), streams);
     if (arguments.given("--json")) {
         printJson(comparison, streams);
@@ -328,6 +328,8 @@ int runDiff(const Arguments& arguments, Streams& streams) {
     streams.out.flush();
     streams.error << comparison.framesDifferent << " of "
                   << std::max(comparison.framesA, comparison.framesB) << " frames differ\n";
+    warnOfLostSetting(a.replay(), "diff", "--set-a", streams);
+    warnOfLostSetting(b.replay(), "diff", "--set-b", streams);
     return comparison.framesDifferent == 0 ? kExitSuccess : kExitFailure;
 }
 

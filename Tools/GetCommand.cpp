@@ -7,7 +7,9 @@
 #include "Tools/Failure.h"
 #include "Tools/HostedDevice.h"
 #include "Tools/OptionValues.h"
+#include "Tools/SettingKeys.h"
 
+#include <algorithm>
 #include <array>
 #include <functional>
 #include <string>
@@ -22,9 +24,11 @@ constexpr std::string_view kRecordingKey = "Recording";
 
 constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "KEY",
-     .help = "A property: the service's own (Version, Recording, DisjointImageCount, "
-             "FirmwareVersion, FactoryResetHoldDuration, CriticalErrors, ServicePluginDebug), a "
-             "setting or counter (Pipeline.Algs.EventStats) or one of the device (Product)",
+     .help =
+         "A property: the service's own (Version, Recording, DisjointImageCount, "
+         "FirmwareVersion, FactoryResetHoldDuration, CriticalErrors, ServicePluginDebug), a "
+         "setting or counter (Pipeline.Algs.EventStats, or EventStats alone) or one of the device "
+         "(Product)",
      .required = false,
      .kind = ValueKind::Text,
      .repeatable = true},
@@ -162,7 +166,8 @@ void printLines(const Properties& properties, Streams& streams) {
 
 int runGet(const Arguments& arguments, Streams& streams) {
     const bool all = arguments.given("--all");
-    const std::vector<std::string>& keys = arguments.values("KEY");
+    std::vector<std::string> keys = arguments.values("KEY");
+    std::ranges::transform(keys, keys.begin(), &hostKey);
     if (all != keys.empty()) {
         throw UsageError("get: expected either a KEY or --all");
     }

@@ -1,5 +1,6 @@
 #include "Tools/Replay.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace VexaTouch::Tools {
@@ -18,13 +19,31 @@ std::string_view playedTypeName(PlayedType type) noexcept {
     return "state";
 }
 
-Replay::Replay(FrameList frames, std::span<const Setting> settings, Vexa::HostClock& clock)
-    : recording_(std::move(frames), clock), upcoming_(recording_.frames().begin()) {
+Replay::Replay(FrameList frames, ReplaySettings settings, Vexa::HostClock& clock)
+    : settings_(std::move(settings)),
+      recording_(std::move(frames), clock),
+      upcoming_(recording_.frames().begin()) {
     installProbes();
     recording_.playReset();
-    for (const Setting& setting : settings) {
-        // The base operation: the recording neither keeps it nor ends its playback.
-        recording_.Pipeline::setState(setting.key, setting.value);
+    giveSettings(false);
+}
+
+void Replay::giveSettings(bool again) {
+    for (const Setting& setting : settings_.list) {
+        // What cannot be read is an action, which is done once.
+        if (!again || recording_.getState(setting.key)) {
+            // The base operation: the recording neither keeps it nor ends its playback.
+            recording_.Pipeline::setState(setting.key, setting.value);
+        }
+    }
+}
+
+void Replay::lookAtState(const PipelineRecording::Frame& frame) {
+    if (settings_.pinned) {
+        giveSettings(true);
+    } else if (!lost_ && std::ranges::find(settings_.list, frame.key, &Setting::key) !=
+                             settings_.list.end()) {
+        lost_ = {.key = frame.key, .index = counts_.frames};
     }
 }
 
@@ -54,6 +73,9 @@ const PlayedFrame& Replay::next(float speed) {
     events_.clear();
     played_.type = PlayedType::State;
     recording_.playNextFrame(speed);
+    if (upcoming_->type == PipelineRecording::Frame::Type::State) {
+        lookAtState(*upcoming_);
+    }
     played_.index = counts_.frames;
     played_.frame = &*upcoming_;
     played_.events = events_;

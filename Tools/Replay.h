@@ -11,6 +11,7 @@
 #include <limits>
 #include <optional>
 #include <span>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -42,14 +43,28 @@ struct ReplayCounts {
     std::uint64_t events = 0;
 };
 
-/// Plays a recording through a pipeline frame by frame. Settings are given to the pipeline before
-/// the first frame and are not part of the recording; a state frame of the recording may change
-/// them later. Not thread safe, not movable.
+/// Settings that are given to a replay. They are not part of the recording.
+struct ReplaySettings {
+    std::vector<Setting> list = {};
+    /// They are given anew after each state frame, so that a recording cannot change them;
+    /// otherwise they are given before the first frame and a state frame may change them.
+    bool pinned = false;
+};
+
+/// A setting that was given and then changed by the recording.
+struct LostSetting {
+    std::string key;          ///< as a pipeline takes it
+    std::uint64_t index = 0;  ///< of the state frame
+
+    friend bool operator==(const LostSetting&, const LostSetting&) = default;
+};
+
+/// Plays a recording through a pipeline frame by frame. Not thread safe, not movable.
 class Replay {
 public:
     static constexpr float kNoWaiting = std::numeric_limits<float>::infinity();
 
-    explicit Replay(FrameList frames, std::span<const Setting> settings = {},
+    explicit Replay(FrameList frames, ReplaySettings settings = {},
                     Vexa::HostClock& clock = Vexa::HostClock::system());
     ~Replay() = default;
     Replay(const Replay&) = delete;
@@ -65,10 +80,16 @@ public:
     [[nodiscard]] const Algs& algs() const noexcept { return recording_.algs(); }
     [[nodiscard]] const FrameList& frames() const noexcept { return recording_.frames(); }
     [[nodiscard]] const ReplayCounts& counts() const noexcept { return counts_; }
+    /// The first setting so far that did not hold, when they are not pinned.
+    [[nodiscard]] const std::optional<LostSetting>& lostSetting() const noexcept { return lost_; }
 
 private:
     void installProbes();
+    void giveSettings(bool again);
+    void lookAtState(const PipelineRecording::Frame& frame);
 
+    ReplaySettings settings_;
+    std::optional<LostSetting> lost_;
     PipelineRecording recording_;
     FrameList::Iterator upcoming_;
     PlayedFrame played_;

@@ -9,6 +9,7 @@
 #include "Tools/Progress.h"
 #include "Tools/RecordingFile.h"
 #include "Tools/Replay.h"
+#include "Tools/ReplayOptions.h"
 #include "Tools/TraceText.h"
 
 #include <array>
@@ -29,7 +30,7 @@ constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "FILE", .help = "The recording; - reads standard input"},
 }};
 
-constexpr std::array<OptionEntry, 6> kOptions = {{
+constexpr std::array<OptionEntry, 7> kOptions = {{
     {.name = "--speed",
      .valueName = "FACTOR",
      .help = "How fast to play: 1 as recorded, 2 twice as fast, max without waiting",
@@ -42,8 +43,8 @@ constexpr std::array<OptionEntry, 6> kOptions = {{
              "the recording itself may change it later",
      .repeatable = true,
      .kind = ValueKind::Choice,
-     .choices = "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= "
-                "EnableTapSuppression= VirtualNormalizationFactors. ResetEventStats="},
+     .choices = kSettingChoices},
+    kPinOption,
     {.name = "--json", .help = "Print each event as one JSON object on a line"},
     {.name = "--trace",
      .valueName = "TRACE",
@@ -88,7 +89,8 @@ constexpr std::string_view kDescription =
     "firmware-reset.\n"
     "\n"
     "Settings are named as the host names them, Pipeline.Algs.ActivationThreshold, or by the last "
-    "part alone. A wrong --set prints the list of keys.";
+    "part alone. A wrong --set prints the list of keys. A recording that vexatouch record made "
+    "begins with all settings that were in force: with --pin those given here hold nevertheless.";
 
 float parseSpeed(const std::string& text) {
     if (text == "max") {
@@ -194,7 +196,8 @@ int reportDifference(const std::vector<EventRecord>& expected,
 
 int runReplay(const Arguments& arguments, Streams& streams) {
     const float speed = parseSpeed(arguments.value("--speed"));
-    const std::vector<Setting> settings = parseSettings(arguments.values("--set"));
+    ReplaySettings settings{.list = parseSettings(arguments.values("--set")),
+                            .pinned = arguments.given(kPinOption.name)};
     const bool expecting = arguments.given("--expect");
     if (expecting && arguments.value("--trace") == "-") {
         throw UsageError("--expect and --trace - both want standard output");
@@ -223,7 +226,7 @@ int runReplay(const Arguments& arguments, Streams& streams) {
     std::vector<EventRecord> actual;
 
     const auto playStart = std::chrono::steady_clock::now();
-    Replay replay(std::exchange(file.frames, {}), settings, streams.clock);
+    Replay replay(std::exchange(file.frames, {}), std::move(settings), streams.clock);
     {
         Progress progress(streams, "playing " + file.name, replay.frames().size());
         while (replay.canContinue()) {
@@ -248,6 +251,7 @@ int runReplay(const Arguments& arguments, Streams& streams) {
     }
     streams.out.flush();
     printSummary(file, replay.counts(), readSeconds, playSeconds, streams);
+    warnOfLostSetting(replay, "replay", "--set", streams);
     return expecting ? reportDifference(expected, actual, arguments.value("--expect"), streams)
                      : kExitSuccess;
 }

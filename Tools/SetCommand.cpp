@@ -19,7 +19,8 @@ namespace {
 
 constexpr std::array<PositionalEntry, 2> kPositionals = {{
     {.name = "KEY",
-     .help = "A setting (Pipeline.Algs.HoldTimeoutMilliseconds) or a property of the device",
+     .help = "A setting (Pipeline.Algs.HoldTimeoutMilliseconds, or HoldTimeoutMilliseconds alone) "
+             "or a property of the device",
      .kind = ValueKind::Text},
     {.name = "VALUE",
      .help = "The value as JSON: 300, true, [1, 2]; a string with its quotes, '\"grey\"'",
@@ -97,16 +98,22 @@ Vexa::PropertyValue setAtOwnDevice(const Arguments& arguments, const std::string
     HostedDevice hosted(
         makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
     hosted.begin();
+    const bool isNew = !hosted.session().property(key);
     if (!hosted.session().setProperty(key, value)) {
         throw Failure(key + ": the device did not take the value");
     }
     Vexa::PropertyValue now = hosted.session().property(key);
     hosted.end();
+    if (isNew && now) {
+        streams.error
+            << "vexatouch set: " << key
+            << " is no setting and was no property: the device keeps it, as it does any\n";
+    }
     return now;
 }
 
 int runSet(const Arguments& arguments, Streams& streams) {
-    const std::string key = arguments.value("KEY");
+    const std::string key = hostKey(arguments.value("KEY"));
     const std::string text = arguments.value("VALUE");
     const Vexa::PropertyValue value = Vexa::readJson(text);
     if (!value) {

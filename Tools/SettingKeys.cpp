@@ -57,13 +57,24 @@ void checkKey(const Given& given, std::string_view key) {
 
 }  // namespace
 
+std::string hostKey(std::string_view key) {
+    if (key.starts_with(kPipelinePrefix)) {
+        return std::string(kHostPrefix) + std::string(key.substr(kPipelinePrefix.size()));
+    }
+    const std::string_view name = key.substr(0, key.find('.'));
+    const bool isBare =
+        std::ranges::find(kStateKeys, name, &StateKeyEntry::name) != kStateKeys.end();
+    return (isBare ? std::string(kHostPrefix) : std::string()) + std::string(key);
+}
+
 Setting parseSetting(std::string_view text, std::string_view option) {
     const Given given{.option = option, .text = text};
     const std::size_t equals = text.find('=');
     if (equals == std::string_view::npos) {
         refuse(given, "KEY=VALUE is needed");
     }
-    std::string_view key = text.substr(0, equals);
+    const std::string fullKey = hostKey(text.substr(0, equals));
+    std::string_view key = fullKey;
     if (key.starts_with(kHostPrefix)) {
         key.remove_prefix(kHostPrefix.size());
     }

@@ -22,10 +22,13 @@ inline constexpr std::string_view kSettingChoices =
     "ActivationThreshold= HoldTimeoutMilliseconds= EnableHoldSuppression= EnableTapSuppression= "
     "VirtualNormalizationFactors. ResetEventStats=";
 
-/// Reads KEY=VALUE: the key as the host writes it ("Pipeline.Algs.ActivationThreshold") or the bare
-/// key of the algorithm, the value as JSON. Throws UsageError, with the list of keys, for a key
-/// that nothing knows, a read-only key, an index out of range or a value that is no JSON. `option`
-/// is what the text was given to, for the message.
+/// The key as the host writes it ("Pipeline.Algs.ActivationThreshold") of one that a pipeline
+/// takes ("Algs.ActivationThreshold") or of the algorithm's bare key; any other as it is.
+std::string hostKey(std::string_view key);
+
+/// Reads KEY=VALUE: the key in any of the three forms of hostKey, the value as JSON. Throws
+/// UsageError, with the list of keys, for a key that nothing knows, a read-only key, an index out
+/// of range or a value that is no JSON. `option` is what the text was given to, for the message.
 Setting parseSetting(std::string_view text, std::string_view option = "--set");
 std::vector<Setting> parseSettings(std::span<const std::string> texts,
                                    std::string_view option = "--set");

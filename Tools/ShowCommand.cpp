@@ -7,6 +7,7 @@
 #include "Tools/OptionValues.h"
 #include "Tools/RecordingFile.h"
 #include "Tools/Replay.h"
+#include "Tools/ReplayOptions.h"
 #include "Tools/SettingKeys.h"
 #include "Tools/TerminalColor.h"
 
@@ -28,7 +29,7 @@ constexpr std::array<PositionalEntry, 1> kPositionals = {{
     {.name = "FILE", .help = "The recording; - reads standard input"},
 }};
 
-constexpr std::array<OptionEntry, 6> kOptions = {{
+constexpr std::array<OptionEntry, 7> kOptions = {{
     {.name = "--frame",
      .valueName = "N|A:B",
      .help = "Print one frame, or the frames from A up to before B (either may be left out), and "
@@ -50,7 +51,10 @@ constexpr std::array<OptionEntry, 6> kOptions = {{
      .valueName = "KEY=VALUE",
      .help = "Give the algorithm a setting before the first frame; the value is JSON. Settings of "
              "the recording itself may change it later",
-     .repeatable = true},
+     .repeatable = true,
+     .kind = ValueKind::Choice,
+     .choices = kSettingChoices},
+    kPinOption,
 }};
 
 constexpr std::array<ExampleEntry, 4> kExamples = {{
@@ -332,7 +336,8 @@ private:
 };
 
 int runShow(const Arguments& arguments, Streams& streams) {
-    const std::vector<Setting> settings = parseSettings(arguments.values("--set"));
+    ReplaySettings settings{.list = parseSettings(arguments.values("--set")),
+                            .pinned = arguments.given(kPinOption.name)};
     const float speed = parseSpeed(arguments.value("--speed"));
     const ColorDepth depth = colorOption(arguments, "--color", streams);
     const bool text = arguments.given("--text");
@@ -347,7 +352,7 @@ int runShow(const Arguments& arguments, Streams& streams) {
     const bool whole = !arguments.given("--frame");
     const FrameRange range = whole ? FrameRange{.begin = 0, .end = count, .single = false}
                                    : parseRange(arguments.value("--frame"), count, file.name);
-    Replay replay(std::exchange(file.frames, {}), settings);
+    Replay replay(std::exchange(file.frames, {}), std::move(settings));
     if (text) {
         printTexts(replay, range, arguments.given("--unsigned"), file.name, streams);
         return kExitSuccess;

@@ -30,6 +30,13 @@ TEST_F(DiffCommandTest, TheSameRecordingIsTheSame) {
                              "0 of 125 frames differ\n"}));
 }
 
+/// The session sets the timeout itself, near its end.
+std::string lost(const std::string& option) {
+    return "vexatouch diff: " + option +
+           " Algs.HoldTimeoutMilliseconds held until frame 98 only, in which the recording sets "
+           "it; with --pin it holds to the end\n";
+}
+
 TEST_F(DiffCommandTest, AnotherSettingShowsTheFirstFrameAndACountPerField) {
     const std::string expected =
         "First difference at frame index 58:\n"
@@ -55,7 +62,7 @@ TEST_F(DiffCommandTest, AnotherSettingShowsTheFirstFrameAndACountPerField) {
         "  stats.numQuarnCallIncrement  66\n"
         "  events                       2\n";
     EXPECT_EQ(diff({session, "--set-b", "HoldTimeoutMilliseconds=300"}),
-              (CommandResult{1, expected, "67 of 125 frames differ\n"}));
+              (CommandResult{1, expected, "67 of 125 frames differ\n" + lost("--set-b")}));
     EXPECT_EQ(diff({session, "--set-a", "HoldTimeoutMilliseconds=500", "--set-b",
                     "Pipeline.Algs.HoldTimeoutMilliseconds=300"})
                   .out,
@@ -77,7 +84,13 @@ TEST_F(DiffCommandTest, JsonHoldsTheSame) {
             R"("lastDispatchedPhase":20,"stats.numBeginHold":20,"stats.numIncrementHold":66,)"
             R"("stats.numQuarnCall":20,"stats.numQuarnCallIncrement":66,"events":2}})"
             "\n",
-            "67 of 125 frames differ\n"}));
+            "67 of 125 frames differ\n" + lost("--set-a")}));
+}
+
+TEST_F(DiffCommandTest, APinnedSettingHoldsToTheEnd) {
+    const CommandResult result = diff({session, "--pin", "--set-b", "HoldTimeoutMilliseconds=300"});
+    EXPECT_EQ(result.exitCode, 1);
+    EXPECT_EQ(result.error, "67 of 125 frames differ\n");
 }
 
 TEST_F(DiffCommandTest, ManyFieldsOfTheFirstFrameAreCutShort) {

@@ -44,7 +44,7 @@ std::vector<std::string> withoutHeading(std::vector<std::string> lines) {
 /// The picture of the last report of a recording, as replay shows it.
 std::vector<std::string> replayedPicture(const std::string& name,
                                          std::span<const Setting> settings = {}) {
-    Replay replay(example(name).frames, settings);
+    Replay replay(example(name).frames, {.list = {settings.begin(), settings.end()}});
     FrameView view(ColorDepth::None, kColumns, 0, replay.frames().size());
     std::vector<std::string> lines;
     while (replay.canContinue()) {

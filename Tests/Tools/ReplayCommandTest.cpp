@@ -22,8 +22,10 @@ namespace VexaTouch::Testing {
 namespace {
 
 using ::testing::ElementsAre;
+using ::testing::EndsWith;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::Not;
 using ::testing::StartsWith;
 using Vexa::Log;
 using Vexa::LogCategory;
@@ -125,6 +127,13 @@ TEST_F(ReplayCommandTest, ASettingOfTheRecordingComesLater) {
     const CommandResult result =
         replay({folder.file("set.json", recorded.text()), "--set", "HoldTimeoutMilliseconds=2000"});
     EXPECT_THAT(result.out, HasSubstr("hold-start"));
+    EXPECT_THAT(result.error, EndsWith("vexatouch replay: --set Algs.HoldTimeoutMilliseconds held "
+                                       "until frame 0 only, in which the recording sets it; with "
+                                       "--pin it holds to the end\n"));
+    const CommandResult pinned =
+        replay({folder.path("set.json"), "--set", "HoldTimeoutMilliseconds=2000", "--pin"});
+    EXPECT_THAT(pinned.out, Not(HasSubstr("hold-start")));
+    EXPECT_THAT(pinned.error, Not(HasSubstr("held until")));
 }
 
 TEST_F(ReplayCommandTest, SettingsThatCannotBeAreUsageErrorsWithTheListOfKeys) {
@@ -514,7 +523,7 @@ TEST_F(ReplayCommandTest, EveryTracedFieldReadsBackToTheStateOfItsFrame) {
         const std::vector<PropertyValue> lines =
             traceOf(replay({session, "--trace", "-", "--set", setting}).out);
         const std::vector<Tools::Setting> settings = {Tools::parseSetting(setting)};
-        Tools::Replay played(mixedSession().frames(), settings);
+        Tools::Replay played(mixedSession().frames(), {.list = settings});
         for (const PropertyValue& line : lines) {
             ASSERT_TRUE(played.canContinue());
             played.next();

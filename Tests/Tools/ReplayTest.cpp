@@ -6,6 +6,7 @@
 
 #include <gmock/gmock.h>
 
+#include <optional>
 #include <set>
 #include <stdexcept>
 #include <string>
@@ -89,12 +90,53 @@ TEST(ReplayTest, TheEndIsAFinishedPlayback) {
 TEST(ReplayTest, SettingsAreGivenBeforeTheFirstFrameAndAreNotRecorded) {
     const std::vector<Setting> settings = {{"Algs.ActivationThreshold", 50.0},
                                            {"Algs.ActivationThreshold", 75.0}};
-    Replay replay(mixedSession().frames(), settings);
+    Replay replay(mixedSession().frames(), {.list = settings});
     EXPECT_EQ(replay.algs().handStats()._activationThreshold, 75.0F);
     EXPECT_TRUE(replay.canContinue());
     EXPECT_EQ(replay.frames(), mixedSession().frames());
     replay.next();
     EXPECT_EQ(replay.counts().states, 0U);
+}
+
+// Two state frames of the recording: one of a setting that was given, one of another.
+RecordedSession sessionWithSettings() {
+    RecordedSession recorded;
+    recorded.feel(nothing())
+        .set("Algs.ActivationThreshold", 100)
+        .set("Algs.HoldTimeoutMilliseconds", 700)
+        .feel(nothing());
+    return recorded;
+}
+
+TEST(ReplayTest, ASettingThatTheRecordingChangesIsLostAndToldOf) {
+    Replay replay(sessionWithSettings().frames(), {.list = {{"Algs.ActivationThreshold", 50.0}}});
+    replay.next();
+    EXPECT_EQ(replay.lostSetting(), std::nullopt);
+    replay.next();
+    EXPECT_EQ(replay.algs().handStats()._activationThreshold, 100.0F);
+    EXPECT_EQ(replay.lostSetting(), (LostSetting{.key = "Algs.ActivationThreshold", .index = 1}));
+}
+
+TEST(ReplayTest, APinnedSettingHoldsWhateverTheRecordingSets) {
+    Replay replay(sessionWithSettings().frames(),
+                  {.list = {{"Algs.ActivationThreshold", 50.0}}, .pinned = true});
+    while (replay.canContinue()) {
+        replay.next();
+        EXPECT_EQ(replay.algs().handStats()._activationThreshold, 50.0F);
+    }
+    EXPECT_EQ(replay.algs().handStats()._hold_timeout_ms, 700U);
+    EXPECT_EQ(replay.lostSetting(), std::nullopt);
+    EXPECT_EQ(replay.frames(), sessionWithSettings().frames());
+}
+
+TEST(ReplayTest, APinnedActionIsDoneOnceOnly) {
+    RecordedSession recorded = mixedSession();
+    recorded.set("Algs.ActivationThreshold", 100);
+    Replay replay(recorded.frames(), {.list = {{"Algs.ResetEventStats", 0}}, .pinned = true});
+    while (replay.canContinue()) {
+        replay.next();
+    }
+    EXPECT_GT(replay.algs().eventStats()._stats.numTaps, 0U);
 }
 
 TEST(ReplayTest, AHugeGapIsNotWaitedForAtFullSpeed) {

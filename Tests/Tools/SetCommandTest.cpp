@@ -45,10 +45,25 @@ TEST_F(SetCommandTest, AValueThatIsNoNumberCountsAs0) {
 TEST_F(SetCommandTest, APropertyOfTheDeviceTakesAnyValue) {
     EXPECT_EQ(set({"Product", "\"My surface\""}),
               (CommandResult{0, "Product: \"My surface\"\n", ""}));
-    EXPECT_EQ(set({"Colours", R"([1, {"a": null}])"}),
-              (CommandResult{0, "Colours: [1,{\"a\":null}]\n", ""}));
-    EXPECT_EQ(set({"--json", "Colour", "2.5"}),
-              (CommandResult{0, "{\n  \"Colour\": 2.5\n}\n", ""}));
+    EXPECT_EQ(set({"--json", "Product", R"([1, {"a": null}])"}),
+              (CommandResult{0,
+                             "{\n  \"Product\": [\n    1,\n    {\n      \"a\": null\n    }\n  "
+                             "]\n}\n",
+                             ""}));
+}
+
+TEST_F(SetCommandTest, APropertyThatTheDeviceDidNotHaveIsToldOf) {
+    EXPECT_EQ(set({"Colour", "2.5"}),
+              (CommandResult{0, "Colour: 2.5\n",
+                             "vexatouch set: Colour is no setting and was no property: the device "
+                             "keeps it, as it does any\n"}));
+}
+
+TEST_F(SetCommandTest, ASettingIsKnownByItsLastPartToo) {
+    for (const std::string key : {"HoldTimeoutMilliseconds", "Algs.HoldTimeoutMilliseconds"}) {
+        EXPECT_EQ(set({key, "300"}),
+                  (CommandResult{0, "Pipeline.Algs.HoldTimeoutMilliseconds: 300\n", ""}));
+    }
 }
 
 TEST_F(SetCommandTest, TheServicesOwnKeysStayAsTheyAre) {

@@ -32,10 +32,22 @@ std::string reason(const std::string& text) {
     return whole.substr(0, whole.find('\n'));
 }
 
-TEST(SettingKeysTest, TheHostsKeyAndTheBareKeyMeanTheSame) {
+TEST(SettingKeysTest, TheThreeFormsOfAKeyMeanTheSame) {
     const Setting expected{"Algs.ActivationThreshold", PropertyValue(150)};
     EXPECT_EQ(parseSetting("Pipeline.Algs.ActivationThreshold=150"), expected);
+    EXPECT_EQ(parseSetting("Algs.ActivationThreshold=150"), expected);
     EXPECT_EQ(parseSetting("ActivationThreshold=150"), expected);
+}
+
+TEST(SettingKeysTest, OnlyKeysOfTheAlgorithmBecomeTheHosts) {
+    EXPECT_EQ(hostKey("EventStats"), "Pipeline.Algs.EventStats");
+    EXPECT_EQ(hostKey("VirtualNormalizationFactors.3"),
+              "Pipeline.Algs.VirtualNormalizationFactors.3");
+    EXPECT_EQ(hostKey("Algs.Anything"), "Pipeline.Algs.Anything");
+    for (const std::string key :
+         {"Pipeline.Algs.EventStats", "Recording", "Product", "EventStatsX", "", "."}) {
+        EXPECT_EQ(hostKey(key), key);
+    }
 }
 
 TEST(SettingKeysTest, ValuesAreAnyJson) {
@@ -71,9 +83,9 @@ TEST(SettingKeysTest, EveryWritableKeyIsTakenAndReachesTheAlgorithm) {
 
 TEST(SettingKeysTest, KeysThatNothingKnowsAreRefused) {
     for (const std::string key :
-         {"", "Foo", "activationThreshold", "Algs.ActivationThreshold", "ActivationThreshold.1",
-          "Pipeline.ActivationThreshold", "Pipeline.Algs.", "VirtualNormalizationFactors",
-          "EventStats.numTaps", "Pipeline.Algs.Pipeline.Algs.ActivationThreshold"}) {
+         {"", "Foo", "activationThreshold", "ActivationThreshold.1", "Pipeline.ActivationThreshold",
+          "Pipeline.Algs.", "VirtualNormalizationFactors", "EventStats.numTaps",
+          "Pipeline.Algs.Pipeline.Algs.ActivationThreshold"}) {
         std::string shown = key;
         if (shown.starts_with("Pipeline.Algs.")) {
             shown.erase(0, 14);
