@@ -574,6 +574,10 @@ FrameList ContainerReader::recover() {
     return std::move(state_->handler.arrayToRecover().frames);
 }
 
+std::uint64_t ContainerReader::wholeFrames() const noexcept {
+    return state_->handler.arrayToRecover().frames.size();
+}
+
 std::uint64_t ContainerReader::refusedFrames() const noexcept {
     return state_->handler.arrayToRecover().refused;
 }

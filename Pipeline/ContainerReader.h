@@ -41,6 +41,8 @@ public:
     /// For texts that are damaged or cut off: the whole, well-formed frames read so far, of
     /// whichever version. The reader is spent afterwards.
     FrameList recover();
+    /// Whole, well-formed frames read so far, of whichever version.
+    [[nodiscard]] std::uint64_t wholeFrames() const noexcept;
     /// Whole frames read so far that were refused.
     [[nodiscard]] std::uint64_t refusedFrames() const noexcept;
 

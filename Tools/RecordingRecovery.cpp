@@ -51,6 +51,26 @@ Attempt readFrom(std::string_view begin, std::string_view text) {
     return attempt;
 }
 
+// Whether a frame stands at the beginning of the text. Reads little more than that element, or the
+// search for a frame would read the rest of the text anew at each brace.
+bool beginsWithFrame(std::string_view begin, std::string_view text) {
+    constexpr std::size_t kFirstPiece = 64;
+    ContainerReader reader;
+    reader.write(begin);
+    std::size_t piece = kFirstPiece;
+    for (std::size_t read = 0; read < text.size(); read += piece, piece *= 2) {
+        const bool isGood = reader.write(text.substr(read, piece));
+        if (reader.wholeFrames() + reader.refusedFrames() > 0) {
+            // Pieces end anywhere: one of the next elements may be the frame, which does as well.
+            return reader.wholeFrames() > 0;
+        }
+        if (!isGood) {
+            return false;
+        }
+    }
+    return false;
+}
+
 // The rest of the text from the first object on that is a frame.
 struct Resumed {
     std::uint64_t position;
@@ -68,6 +88,9 @@ std::optional<Resumed> resume(std::string_view text, std::uint64_t faultAt,
          position != std::string_view::npos; position = text.find('{', position + 1)) {
         for (const std::string_view begin : {kBeginVersion1, kBeginVersion0}) {
             if (version && (*version == 0) != (begin == kBeginVersion0)) {
+                continue;
+            }
+            if (!beginsWithFrame(begin, text.substr(position))) {
                 continue;
             }
             Attempt attempt = readFrom(begin, text.substr(position));

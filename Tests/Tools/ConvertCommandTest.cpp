@@ -442,6 +442,21 @@ TEST(RecordingRecovery, ElementsThatAreNoFramesAreCounted) {
     EXPECT_THAT(recovery.damages, ElementsAre("invalid frame type", "2 elements are no frames"));
 }
 
+// Each brace may begin the next frame; reading on to the end at each would take hours here.
+TEST(RecordingRecovery, ManyElementsThatAreNoFramesAreSearchedOnce) {
+    std::string text = R"({"Version":1,"Frames":[!)";
+    for (int i = 0; i < 200'000; ++i) {
+        text += "{},";
+    }
+    const std::string frame = R"({"Type":"InputReport","Timestamp":1,"Report":"01"})";
+    text += frame + "]}";
+    const Tools::RecordingRecovery recovery = Tools::recoverContainer(text);
+    ASSERT_EQ(recovery.frames.size(), 1U);
+    EXPECT_EQ(recovery.frames.front().report, std::vector<std::uint8_t>{1});
+    ASSERT_EQ(recovery.damages.size(), 2U);
+    EXPECT_THAT(recovery.damages[1], ::testing::EndsWith("no frames"));
+}
+
 TEST(RecordingRecovery, WithoutItsBeginningARecordingStillHoldsFrames) {
     const Frames frames = smallSession();
     const std::string text = containerText(frames);
