@@ -26,12 +26,12 @@ void askForRealTime() noexcept {
     static_cast<void>(pthread_setschedparam(pthread_self(), SCHED_RR, &parameter));
 }
 
-/// What keeps a queue from being made is nearly always a limit on threads.
 Vexa::SerialQueue eventsQueue(const std::string& file) {
     try {
         return Vexa::SerialQueue(kQueueLabel);
     } catch (const std::bad_alloc&) {
-        throw HostFailure(file + ": no thread for the events' queue");
+        throw HostFailure(file +
+                          ": no thread or no descriptors (it takes four) for the events' queue");
     }
 }
 

@@ -14,7 +14,7 @@ class SerialQueue {
 public:
     /// No queue.
     SerialQueue() noexcept = default;
-    /// Throws std::bad_alloc when there is no memory or no thread.
+    /// Throws std::bad_alloc when there is no memory, no thread or no descriptor.
     explicit SerialQueue(const char* label) : handle_(Reference::adopt(vexa_queue_create(label))) {
         if (!handle_) throw std::bad_alloc();
     }

@@ -11,7 +11,8 @@ namespace VexaTouch {
 ///
 /// What the host passes is borrowed for the call and wrapped in references of our own; these, and
 /// every other temporary, are gone when the function returns. No exception leaves: without memory
-/// a function answers like one that failed, or ends the process where there is no such answer.
+/// a function answers like one that failed, or ends the process where there is no such answer and
+/// where the pipeline runs out of it.
 class VexaIUnknown {
 public:
     VexaIUnknown() = delete;

@@ -70,7 +70,7 @@ public:
     void scheduleWithDispatchQueue(const Vexa::SerialQueue& queue) override;
     /// Returns once the input thread has taken back its probes and the device; without one it only
     /// lets the queue go. Neither the input thread itself nor a holder of `_pipelineLock` (a sink
-    /// of the log or of the trace points may be called under it) can wait for that: a build with
+    /// of the trace points is called under it on the input thread) can wait for that: a build with
     /// assertions aborts, another one waits forever.
     void unscheduleWithDispatchQueue(const Vexa::SerialQueue& queue) override
         EXCLUDES(_pipelineLock);

@@ -32,8 +32,7 @@ constinit thread_local const vexa_queue* current = nullptr;
 
 /// The queue's thread waits in libevent for a wake. Whoever submits pushes its task on a stack,
 /// without a lock that a slower thread could hold; the thread takes the whole stack and turns it
-/// over. The push onto an empty stack wakes it, so there is one wake for each time that it takes
-/// the stack, never more. The wake is an edge: nothing has to be read to be woken again.
+/// over. Each push wakes it; the wake is an edge, so nothing has to be read to be woken again.
 struct vexa_queue final : private Counted<VEXA_OBJECT_QUEUE> {
 public:
     static vexa_queue* create(const char* label) noexcept {
@@ -116,8 +115,8 @@ private:
             node.next = older;
         } while (!newest_.compare_exchange_weak(older, &node, std::memory_order_release,
                                                 std::memory_order_relaxed));
-        if (older) return;
-        // The node may have run and be gone by now; the queue is not: whoever pushes holds it.
+        // The node may have run and be gone by now; the queue is not: whoever pushes holds it. Not
+        // only who found the stack empty wakes the thread: that one may be slow to come here.
         const std::uint64_t one = 1;
         static_cast<void>(::write(wake_.number(), &one, sizeof one));
     }

@@ -12,12 +12,12 @@
 
 #include <dlfcn.h>
 #include <errno.h>
+#include <sched.h>
 #include <semaphore.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
 #include <sys/socket.h>
-#include <time.h>
 #include <unistd.h>
 #include <vexa/vexa.h>
 
@@ -264,9 +264,9 @@ static const char* living(void) {
 /* What is left over, or NULL. The input thread has done its work when unscheduling returns, but may
  * still be about to let go of what it held. */
 static const char* leftover(void) {
-    const struct timespec pause = {.tv_nsec = 1000000};
-    for (int i = 0; i < 5000 && living() != NULL; ++i) {
-        nanosleep(&pause, NULL);
+    const int manyTimes = 5000000;
+    for (int i = 0; i < manyTimes && living() != NULL; ++i) {
+        sched_yield();
     }
     return living();
 }

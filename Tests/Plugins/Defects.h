@@ -1,6 +1,6 @@
 /* The defects that the sample plug-in can be built with: DEFECT(name, the check that must find it,
  * other checks that it fails as well; with a ? those that it fails now and then, when threads
- * meet). CMake builds one plug-in for each line. */
+ * meet; * any). CMake builds one plug-in for each line. */
 #ifndef VEXA_TESTS_PLUGINS_DEFECTS_H
 #define VEXA_TESTS_PLUGINS_DEFECTS_H
 
@@ -27,6 +27,9 @@
     DEFECT(CountsWithoutAtomics, "reference-threads", "?property-threads")                        \
     DEFECT(ProbeReleasesProperties, "argument-order", "")                                         \
     DEFECT(StartsNeighbour, "argument-order", "destroy-scheduled")                                \
+    DEFECT(ProbeTakesServiceFirst, "argument-order",                                              \
+           "slots device-failures unplug destroy cycles leaks memory unload")                     \
+    DEFECT(StartTakesServiceFirst, "argument-order", "*")                                         \
     DEFECT(StartsWithoutDevice, "unknown-service", "")                                            \
     DEFECT(FloatsBecomeDoubles, "property-values", "")                                            \
     DEFECT(IntegersLoseTheirSign, "property-values", "")                                          \

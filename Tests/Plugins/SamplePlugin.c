@@ -172,6 +172,10 @@ static vexa_status probe(void* self, const vexa_value* properties, uint32_t serv
     (void)self;
     (void)service;
     (void)score;
+    if (has(ProbeTakesServiceFirst) && vexa_value_get_count(properties) > 0) {
+        /* Crashes, as the handle is no value. */
+        (void)vexa_value_get_count((const vexa_value*)(uintptr_t)service);
+    }
     if (has(ProbeReleasesProperties) && vexa_value_get_count(properties) > 0) {
         vexa_value_release(properties);
     }
@@ -196,6 +200,9 @@ static vexa_status start(void* self, const vexa_value* properties, uint32_t serv
     if (has(LeaksValue)) (void)vexa_value_create_signed(1);
     if (has(LeaksDescriptor)) (void)!dup(STDERR_FILENO);
     vexa_device* device = NULL;
+    if (has(StartTakesServiceFirst) && vexa_value_get_count(properties) > 0) {
+        service = (uint32_t)(uintptr_t)properties;
+    }
     if (has(StartsNeighbour)) device = vexa_device_create(service - 1);
     if (device == NULL) device = vexa_device_create(service);
     if (has(LeaksDevice)) vexa_device_retain(device);

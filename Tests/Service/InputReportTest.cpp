@@ -84,6 +84,9 @@ TEST_F(InputReportTest, TheFirstImageOfARunIsNeverDisjoint) {
     EXPECT_EQ(disjointImages(), 1U);
     EXPECT_TRUE(stand.service.set("DisjointImageCount", 0));
     EXPECT_EQ(disjointImages(), 1U);
+    stand.tearDown();
+    stand.startUp();
+    EXPECT_EQ(disjointImages(), 1U);
 }
 
 TEST_F(InputReportTest, OnlyImagesHaveAPlaceInTheSequence) {

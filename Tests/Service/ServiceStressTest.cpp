@@ -101,6 +101,49 @@ TEST(ServiceStressTest, ReportsPropertiesReschedulingAndUnplugMeet) {
     leaks.expectNothingLeft();
 }
 
+// Which of the hosts' threads, the input thread and the events on their way has the last reference
+// is open each time.
+TEST(ServiceStressTest, ReferencesGoFromSeveralThreads) {
+    const QuietLog quiet;
+    const LoadedPlugin plugin(VEXATOUCH_PLUGIN_FILE);
+    EventCollector events;
+    const Vexa::SerialQueue queue("events");
+    const LeakCheck leaks;
+    constexpr int kThreads = 3;
+    for (int i = 0; i < 200; ++i) {
+        const auto device = std::make_shared<Vexa::ScriptedDevice>();
+        const Vexa::DeviceRegistration registration(device);
+        auto* const made = static_cast<vexa_plugin_interface**>(plugin.make());
+        const auto useAndLetGo = [made] {
+            void* other = nullptr;
+            EXPECT_EQ((*made)->QueryInterface(made, VEXA_SERVICE_INTERFACE, &other), 0U);
+            (*made)->AddRef(made);
+            (*made)->Release(made);
+            auto* const service = static_cast<vexa_service_interface**>(other);
+            (*service)->Release(service);
+            (*made)->Release(made);
+        };
+        std::vector<std::thread> threads;
+        {
+            const ServiceUnderTest service(made);
+            ASSERT_EQ(service.start(registration.service()), 0U);
+            service.setEventCallback(&EventCollector::callback, &events, nullptr);
+            service.schedule(queue);
+            ASSERT_TRUE(service.open());
+            for (int thread = 0; thread < kThreads; ++thread) {
+                (*made)->AddRef(made);
+                threads.emplace_back(useAndLetGo);
+            }
+            ASSERT_TRUE(device->sendReport(firmwareReport(0)));
+            service.unschedule(queue);
+        }
+        for (std::thread& thread : threads) thread.join();
+    }
+    queue.drain();
+    EXPECT_LE(events.take().size(), 200U);
+    leaks.expectNothingLeft();
+}
+
 TEST(ServiceStressTest, TheLastReferenceMayGoWhileEventsLand) {
     const QuietLog quiet;
     const LeakCheck leaks;

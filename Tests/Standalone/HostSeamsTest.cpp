@@ -136,7 +136,8 @@ TEST_F(HostSeamsTest, ASessionWithoutAThreadForItsQueueSaysSo) {
     const Host::PluginLibrary library(kFile);
     const auto registration = Host::registeredDevice(std::make_shared<Vexa::ScriptedDevice>());
     const LiveObjects before = LiveObjects::now();
-    const std::string fault = kFile + std::string(": no thread for the events' queue");
+    const std::string fault =
+        kFile + std::string(": no thread or no descriptors (it takes four) for the events' queue");
     haveQueues = false;
     EXPECT_EQ(failureOf([&] {
                   const Host::HostSession session(library, registration.service(),

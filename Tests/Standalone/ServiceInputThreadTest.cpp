@@ -176,7 +176,7 @@ TEST(ServiceInputThreadTest, CallsAreOneWaitAndOneReadForEachReportAndAWakeForAB
                 span.erase(call);
             }
         }
-        calls[0].erase(SYS_futex);
+        for (Calls& span : calls) span.erase(SYS_futex);
     }
     const int reports = kReports + 1;  // the mark's own report too
 #ifdef SYS_epoll_wait
@@ -185,10 +185,9 @@ TEST(ServiceInputThreadTest, CallsAreOneWaitAndOneReadForEachReportAndAWakeForAB
     constexpr std::uint64_t kWait = SYS_epoll_pwait;
 #endif
     EXPECT_THAT(calls[0], UnorderedElementsAre(Pair(kWait, reports), Pair(SYS_read, reports)));
-    EXPECT_GT(calls[1][SYS_futex], 0);
-    EXPECT_LE(calls[1][SYS_futex], kReports);
-    calls[1].erase(SYS_futex);
-    EXPECT_THAT(calls[1], UnorderedElementsAre(Pair(kWait, reports), Pair(SYS_read, reports)));
+    // Each of these reports makes an event, whose way to the queue is one write.
+    EXPECT_THAT(calls[1], UnorderedElementsAre(Pair(kWait, reports), Pair(SYS_read, reports),
+                                               Pair(SYS_write, kReports)));
 }
 
 }  // namespace

@@ -2,6 +2,7 @@
 
 #include "Pipeline/PipelineRecording.h"
 #include "Platform/HostClock.h"
+#include "Platform/TraceListener.h"
 #include "Shared/Util.h"
 #include "Tests/Support/LiveObjects.h"
 #include "Tests/Support/LogCapture.h"
@@ -19,9 +20,11 @@
 #include <vexa/device.h>
 #include <vexa/run_loop.h>
 #include <vexa/value.h>
+#include <array>
 #include <atomic>
 #include <cerrno>
 #include <chrono>
+#include <csignal>
 #include <cstdint>
 #include <functional>
 #include <future>
@@ -76,13 +79,15 @@ std::function<void()> onReadOfNumber;
 
 /// The time that reports come with, in place of the host's; 0: the host's.
 std::atomic<std::uint64_t> deviceTime{0};
+/// What reports have in their id besides its lowest byte.
+std::atomic<std::uint32_t> deviceIdBits{0};
 std::atomic<vexa_input_report_callback> serviceCallback{nullptr};
 
 void passReportOn(void* context, vexa_status result, vexa_device* sender, vexa_report_type type,
                   std::uint32_t reportId, const std::uint8_t* report, std::size_t length,
                   std::uint64_t timestamp) {
     const std::uint64_t other = deviceTime;
-    serviceCallback.load()(context, result, sender, type, reportId, report, length,
+    serviceCallback.load()(context, result, sender, type, reportId | deviceIdBits, report, length,
                            other != 0 ? other : timestamp);
 }
 
@@ -640,6 +645,39 @@ TEST(ServiceSeamsTest, TheDevicesTimeIsOnlyLogged) {
     EXPECT_EQ(recording.frames().begin()->timestamp,
               Util::nanosecondsFromMachTime(events[0].timestamp()));
     stand.tearDown();
+}
+
+TEST(ServiceSeamsTest, AReportIdHasOneByte) {
+    ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+    stand.startUp();
+    LogCapture log;
+    deviceTime = 4711;
+    deviceIdBits = 0x5A00;
+    ASSERT_TRUE(stand.feed({{0xFE}}));
+    deviceIdBits = 0;
+    deviceTime = 0;
+    EXPECT_EQ(log.take().front(),
+              debug("Received input report (type 0, reportID 254, reportLength 1, timestampMach "
+                    "4711)"));
+    stand.tearDown();
+}
+
+TEST(ServiceSeamsTest, TheInputThreadHasItsNameAndBlocksAllSignals) {
+    ServiceStand stand(VEXATOUCH_PLUGIN_FILE);
+    std::array<char, 16> name{};
+    sigset_t blocked{};
+    const Vexa::TraceListener listener([&](std::uint32_t code, auto) {
+        if (code != VEXA_TRACE_REPORT) return;
+        pthread_getname_np(pthread_self(), name.data(), name.size());
+        pthread_sigmask(SIG_BLOCK, nullptr, &blocked);
+    });
+    stand.startUp();
+    ASSERT_TRUE(stand.feed({{9}}));
+    stand.tearDown();
+    EXPECT_STREQ(name.data(), "vexa-input");
+    for (const int signal : {SIGINT, SIGTERM, SIGHUP, SIGUSR1, SIGALRM, SIGCHLD, SIGRTMIN}) {
+        EXPECT_EQ(::sigismember(&blocked, signal), 1) << signal;
+    }
 }
 
 /// Unschedules a service whose run loop takes no more tasks.

@@ -349,7 +349,7 @@ TEST_P(BrokenPluginTest, FailsTheCheckThatLooksForItsDefect) {
     const CommandResult result = validate(plugin, options);
     failed.merge(failures(verdicts(result)));
     EXPECT_TRUE(failed.contains(std::string(defect.check))) << result;
-    if (!kSanitized) {
+    if (!kSanitized && defect.others != "*") {
         // A sanitizer sees some defects in every check.
         std::erase_if(expected, [&](const std::string& check) {
             if (!check.starts_with('?')) {
@@ -369,7 +369,7 @@ TEST(ValidateCommandTest, EveryCheckHasADefectThatItMustFind) {
     std::set<std::string_view> checked;
     for (const Defect& defect : kDefects) {
         EXPECT_NE(findPluginCheck(defect.check), nullptr) << defect.name;
-        for (std::string other : words(defect.others)) {
+        for (std::string other : words(defect.others == "*" ? "" : defect.others)) {
             other.erase(0, other.starts_with('?') ? 1 : 0);
             EXPECT_NE(findPluginCheck(other), nullptr) << defect.name << ": " << other;
         }

@@ -103,8 +103,9 @@ typedef struct vexa_service_interface {
     void (*scheduleWithDispatchQueue)(void* self, vexa_queue* queue);
     /* [after scheduling] Returns when the input thread has done its work: its probes are gone and
      * the device is unscheduled. Events that are on the queue already still come; vexa_queue_drain
-     * waits for the last one. `queue` is not looked at. Not on the input thread, and not within a
-     * sink of the log or of the trace points: either waits forever, a debug build aborts. */
+     * waits for the last one. `queue` is not looked at. Not on the input thread, so not
+     * within a sink of the trace points that runs there either: it waits forever, a debug build
+     * aborts. */
     void (*unscheduleFromDispatchQueue)(void* self, vexa_queue* queue);
     /* [after Start] An event with one reference that the caller owns, or NULL (always so for this
      * service). `matching` may be NULL. */

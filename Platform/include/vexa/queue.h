@@ -25,9 +25,9 @@ VEXA_API vexa_queue* vexa_queue_retain(vexa_queue* queue) VEXA_NOEXCEPT;
 VEXA_API void vexa_queue_release(vexa_queue* queue) VEXA_NOEXCEPT;
 
 /* [any] Runs `task(context)` on the queue's thread, after all that was submitted before. Takes no
- * lock and makes one system call at most, to wake the thread. Returns at once; false when there is
- * no memory (the task is then not run). The caller keeps what `context` points at alive until the
- * task has run. */
+ * lock and makes one system call, to wake the thread. Returns at once; false when there is no
+ * memory (the task is then not run). The caller holds a reference to the queue until this returns,
+ * whatever the task does, and keeps what `context` points at alive until the task has run. */
 VEXA_API bool vexa_queue_submit(vexa_queue* queue, vexa_task task, void* context) VEXA_NOEXCEPT;
 
 /* [any] Returns once all tasks that were submitted before have run; on the queue's own thread,
