@@ -11,9 +11,15 @@ namespace VexaTouch::Testing {
 /// How often the calling thread took memory from the heap, and gave some back.
 inline thread_local std::size_t allocations = 0;
 inline thread_local std::size_t releases = 0;
+/// The calling thread gets no memory when it asks for the so-manieth time from now; 0: it always
+/// does.
+inline thread_local std::size_t failingAllocation = 0;
 
 inline void* countedAllocation(std::size_t size, std::size_t alignment) {
     ++allocations;
+    if (failingAllocation != 0 && --failingAllocation == 0) {
+        throw std::bad_alloc();
+    }
     const std::size_t rounded = (size + alignment - 1) / alignment * alignment;
     void* memory = alignment <= alignof(std::max_align_t) ? std::malloc(size == 0 ? 1 : size)
                                                           : std::aligned_alloc(alignment, rounded);
