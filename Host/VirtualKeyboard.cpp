@@ -40,9 +40,21 @@ std::string_view advice(int error) noexcept {
     }
 }
 
-[[noreturn]] void fail(std::string_view step, const std::string& node, int error) {
-    throw HostFailure("no keyboard: cannot " + std::string(step) + ' ' + node + ": " +
-                      std::generic_category().message(error) + std::string(advice(error)));
+/// The node is there: what fails now is not a missing module.
+std::string_view adviceOnMaking(int error) noexcept {
+    switch (error) {
+        case ENOENT:
+        case ENODEV:
+        case ENXIO:
+            return " (the kernel made it, but it is not to be found in /sys)";
+        default:
+            return advice(error);
+    }
+}
+
+[[noreturn]] void fail(const std::string& step, int error, std::string_view advice) {
+    throw HostFailure("no keyboard: cannot " + step + ": " +
+                      std::generic_category().message(error) + std::string(advice));
 }
 
 /// What the keyboard shall be.
@@ -84,12 +96,13 @@ void VirtualKeyboard::Destroy::operator()(libevdev_uinput* device) const noexcep
 VirtualKeyboard::VirtualKeyboard(std::span<const KeyCode> keys, const std::string& node)
     : node_(node) {
     if (node_.get() < 0) {
-        fail("open", node, errno);
+        const int error = errno;
+        fail("open " + node, error, advice(error));
     }
     libevdev_uinput* made = nullptr;
     const int status = libevdev_uinput_create_from_device(describe(keys).get(), node_.get(), &made);
     if (status < 0) {
-        fail("make one with", node, -status);
+        fail("make one with " + node, -status, adviceOnMaking(-status));
     }
     device_.reset(made);
 }

@@ -64,10 +64,10 @@ inline constexpr std::size_t kLongestHidReport = 16'384;
 
 /// Reads a report descriptor: short items and long ones (passed over), global state with push and
 /// pop, usages of two and of four bytes. What means nothing for the layout of reports is not
-/// checked. Nothing, and why in `error`, when the bytes break off within an item, when collections,
-/// pushes or delimiters do not pair up, when an id is 0 or above 255 and when a report is too long.
-/// Time is at most quadratic and memory linear in the length, whatever the bytes. Any thread;
-/// throws std::bad_alloc.
+/// checked. Nothing, and why in `error`, when the bytes break off within an item, when collections
+/// or delimiters do not pair up, when a pop has no push before it, when an id is 0 or above 255 and
+/// when a report is too long. Time is at most quadratic and memory linear in the length, whatever
+/// the bytes. Any thread; throws std::bad_alloc.
 std::optional<ReportDescriptor> parseReportDescriptor(std::span<const std::uint8_t> bytes,
                                                       ReportDescriptorError* error = nullptr);
 

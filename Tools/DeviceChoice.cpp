@@ -171,17 +171,24 @@ Host::SurfaceMatch matchOption(const Arguments& arguments, const DeviceChoice& c
     return matchOption(arguments);
 }
 
+std::optional<std::uint64_t> seedOption(const Arguments& arguments, const DeviceChoice& choice) {
+    if (choice.kind != DeviceChoice::Kind::Simulated && arguments.given(kSeedOption.name)) {
+        throw UsageError(std::string(kSeedOption.name) + " is for a simulated surface");
+    }
+    return numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+}
+
 DeviceWishes deviceWishes(const Arguments& arguments, const DeviceChoice& choice) {
     DeviceWishes wishes;
     if (choice.kind != DeviceChoice::Kind::Simulated) {
-        for (const OptionEntry& option : {kSeedOption, kRateOption, kEndlessOption}) {
+        for (const OptionEntry& option : {kRateOption, kEndlessOption}) {
             if (arguments.given(option.name)) {
                 throw UsageError(std::string(option.name) + " is for a simulated surface");
             }
         }
     }
     constexpr double kHighestRate = 1e6;
-    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.seed = seedOption(arguments, choice);
     wishes.rate = rateOption(arguments, kRateOption.name, kHighestRate);
     wishes.endless = arguments.given(kEndlessOption.name);
     wishes.match = matchOption(arguments, choice);

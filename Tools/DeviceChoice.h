@@ -102,6 +102,8 @@ Host::SurfaceMatch matchOption(const Arguments& arguments, const DeviceChoice& c
 
 /// What --seed, --rate, --endless and --match say; the command must have all four. Throws
 /// UsageError, also when one is given for a device that has no use of it.
+/// The seed of random gestures, if one was given. Throws UsageError with any other device.
+std::optional<std::uint64_t> seedOption(const Arguments& arguments, const DeviceChoice& choice);
 DeviceWishes deviceWishes(const Arguments& arguments, const DeviceChoice& choice);
 
 /// For a command that talks to the daemon because it was given no device of its own: none of these

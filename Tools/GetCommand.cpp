@@ -117,7 +117,7 @@ Properties readFromOwnDevice(const Arguments& arguments, const std::vector<std::
                              bool all, Streams& streams) {
     const DeviceChoice choice = DeviceChoice::parse(arguments.value(kOwnDeviceOption.name));
     DeviceWishes wishes{.announceSeed = false};
-    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.seed = seedOption(arguments, choice);
     wishes.match = matchOption(arguments, choice);
     HostedDevice hosted(
         makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
@@ -166,10 +166,16 @@ void printLines(const Properties& properties, Streams& streams) {
 
 int runGet(const Arguments& arguments, Streams& streams) {
     const bool all = arguments.given("--all");
-    std::vector<std::string> keys = arguments.values("KEY");
-    std::ranges::transform(keys, keys.begin(), &hostKey);
+    std::vector<std::string> keys;
+    for (const std::string& given : arguments.values("KEY")) {
+        const std::string key = hostKey(given);
+        // One answer a key, or it would stand twice in a JSON object.
+        if (std::ranges::find(keys, key) == keys.end()) {
+            keys.push_back(key);
+        }
+    }
     if (all != keys.empty()) {
-        throw UsageError("get: expected either a KEY or --all");
+        throw UsageError("expected either a KEY or --all");
     }
     const Properties properties = arguments.given(kOwnDeviceOption.name)
                                       ? readFromOwnDevice(arguments, keys, all, streams)

@@ -125,6 +125,19 @@ std::size_t reportsOf(const Arguments& arguments, double rate) {
     return static_cast<std::size_t>(reports);
 }
 
+/// A recording is sent once: there is not more to measure than it holds.
+void fitToSource(LatencyRunOptions& options, const std::string& path) {
+    std::size_t held = 0;
+    options.source([&held](const PlayedDevice::Frame& frame) {
+        held += frame.type == PlayedDevice::Frame::Type::InputReport ? 1U : 0U;
+    });
+    const std::size_t parts = options.reader == LatencyReader::Turns ? 2 : 1;
+    if (held < parts) {
+        throw Failure(path + ": holds " + std::to_string(held) + " reports, too few to measure");
+    }
+    options.reports = std::min(options.reports, held / parts);
+}
+
 Plan planOf(const Arguments& arguments, Streams& streams) {
     Plan plan;
     plan.options.patience = streams.patience;
@@ -152,6 +165,9 @@ Plan planOf(const Arguments& arguments, Streams& streams) {
     plan.options.source = choice.path.empty()
                               ? gestureSource(GestureScript::parse(kLatencyGestures), {}, true)
                               : frameSource(choice, streams);
+    if (choice.kind == DeviceChoice::Kind::Recording) {
+        fitToSource(plan.options, choice.path);
+    }
     return plan;
 }
 
@@ -259,7 +275,8 @@ void printTable(std::span<const LatencyResult> results, Streams& streams) {
 }
 
 void printRatio(std::span<const LatencyResult> results, Streams& streams) {
-    if (results.size() == 2 && toCallback(results[0]).p999 != 0) {
+    if (results.size() == 2 && toCallback(results[0]).samples != 0 &&
+        toCallback(results[1]).samples != 0) {
         streams.out << formatted(
             "p99.9 of report to callback with the reader is %.2f times that "
             "without\n",

@@ -2,6 +2,7 @@
 
 #include "Tools/Failure.h"
 #include "Tools/HostedDevice.h"
+#include "Tools/ReportWatch.h"
 #include "Tools/SimulatedSurface.h"
 #include "Tools/WakeUp.h"
 
@@ -135,13 +136,18 @@ private:
 /// Halts a device before what its hooks and its sink use goes away, whatever happens.
 class HaltedInTheEnd {
 public:
-    explicit HaltedInTheEnd(HostedDevice& device) noexcept : device_(device) {}
-    ~HaltedInTheEnd() { device_.halt(); }
+    HaltedInTheEnd(HostedDevice& device, std::atomic<LatencyProbe*>& listening) noexcept
+        : device_(device), listening_(listening) {}
+    ~HaltedInTheEnd() {
+        device_.halt();
+        listening_.store(nullptr);
+    }
     HaltedInTheEnd(const HaltedInTheEnd&) = delete;
     HaltedInTheEnd& operator=(const HaltedInTheEnd&) = delete;
 
 private:
     HostedDevice& device_;
+    std::atomic<LatencyProbe*>& listening_;
 };
 
 LatencyResult resultOf(const LatencyProbe& probe, const ReaderTurns& turns, bool withReader,
@@ -204,11 +210,12 @@ public:
                 handled();
             };
         }
-        hosted_.begin(std::move(hooks));
-        waitUntilDone();
-        reader.finish();
-        hosted_.halt();
-        listening_.store(nullptr);
+        {
+            const HaltedInTheEnd halted(hosted_, listening_);
+            hosted_.begin(std::move(hooks));
+            waitUntilDone();
+            reader.finish();
+        }
         hosted_.end();
 
         std::vector<LatencyResult> results;
@@ -265,9 +272,19 @@ std::vector<LatencyResult> measureLive(const LatencyRunOptions& options) {
             }
         },
         [&] {
+            ReportWatch watch(*options.live, options.patience);
+            WakeUp::Time nextLook = std::chrono::steady_clock::now() + watch.interval();
             while (handled.load() < wanted && !unplugged &&
                    (!until || std::chrono::steady_clock::now() < *until)) {
-                unplugged = wake.wait(until, options.live->hangUpDescriptor());
+                unplugged = wake.wait(until ? std::min(*until, nextLook) : nextLook,
+                                      options.live->hangUpDescriptor());
+                if (std::chrono::steady_clock::now() < nextLook) {
+                    continue;
+                }
+                nextLook += watch.interval();
+                if (watch.look()) {
+                    throw Failure(ReportWatch::kFault);
+                }
             }
         });
     if (unplugged) {

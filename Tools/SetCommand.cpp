@@ -93,7 +93,7 @@ Vexa::PropertyValue setAtOwnDevice(const Arguments& arguments, const std::string
                                    const Vexa::PropertyValue& value, Streams& streams) {
     const DeviceChoice choice = DeviceChoice::parse(arguments.value(kOwnDeviceOption.name));
     DeviceWishes wishes{.announceSeed = false};
-    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.seed = seedOption(arguments, choice);
     wishes.match = matchOption(arguments, choice);
     HostedDevice hosted(
         makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
@@ -117,7 +117,7 @@ int runSet(const Arguments& arguments, Streams& streams) {
     const std::string text = arguments.value("VALUE");
     const Vexa::PropertyValue value = Vexa::readJson(text);
     if (!value) {
-        throw UsageError("set " + key + ": the value is no JSON: " + text +
+        throw UsageError(key + ": the value is no JSON: " + text +
                          " (a string needs its quotes: '\"" + text + "\"')");
     }
     checkKey(key, text);

@@ -330,6 +330,13 @@ int runAll(const Validation& asked, Streams& streams) {
 
 int runValidate(const Arguments& arguments, Streams& streams) {
     if (arguments.given("--list")) {
+        for (const std::string_view other :
+             {"PLUGIN", "--only", "--seed", "--time-limit", "--here"}) {
+            if (arguments.given(other)) {
+                throw UsageError("--list lists all checks, " + std::string(other) +
+                                 " has no place there");
+            }
+        }
         return listChecks(arguments.given("--json"), streams);
     }
     const Validation asked = readArguments(arguments);

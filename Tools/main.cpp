@@ -1,5 +1,6 @@
 #include "Tools/CommandLine.h"
 
+#include <fcntl.h>
 #include <sys/ioctl.h>
 #include <unistd.h>
 
@@ -7,7 +8,28 @@
 #include <string>
 #include <vector>
 
+namespace {
+
+/// What is opened next must not become a standard stream that the caller has closed: messages would
+/// be written into a result. False when /dev/null cannot be had.
+bool keepStandardStreams() {
+    for (;;) {
+        const int descriptor = open("/dev/null", O_RDWR);
+        if (descriptor < 0) {
+            return false;
+        }
+        if (descriptor > STDERR_FILENO) {
+            return close(descriptor) == 0;
+        }
+    }
+}
+
+}  // namespace
+
 int main(int argc, char** argv) {
+    if (!keepStandardStreams()) {
+        return VexaTouch::Tools::kExitFailure;
+    }
     std::ios::sync_with_stdio(false);
     std::cin.tie(nullptr);
     VexaTouch::Tools::Streams streams{.in = std::cin, .out = std::cout, .error = std::cerr};

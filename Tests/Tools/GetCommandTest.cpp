@@ -92,6 +92,22 @@ TEST_F(GetCommandTest, AsJsonEachKeyIsAMember) {
                                               {"Pipeline.Algs.HoldTimeoutMilliseconds", 500U}}));
 }
 
+TEST_F(GetCommandTest, AKeyThatIsAskedForTwiceIsAnsweredOnce) {
+    const CommandResult result =
+        get({"--json", "EventStats", "Pipeline.Algs.EventStats", "EventStats"});
+    const Vexa::PropertyValue object = Vexa::readJson(result.out);
+    ASSERT_TRUE(object.asDictionary()) << result;
+    EXPECT_EQ(result.out.find("Pipeline.Algs.EventStats"),
+              result.out.rfind("Pipeline.Algs.EventStats"));
+}
+
+TEST_F(GetCommandTest, ASeedIsForASimulatedSurface) {
+    EXPECT_EQ(get({"Version", "--seed", "1", "--device", sessionAtOnce()}),
+              (CommandResult{2, "",
+                             "vexatouch get: --seed is for a simulated surface\nTry 'vexatouch get "
+                             "--help'.\n"}));
+}
+
 TEST_F(GetCommandTest, AllIsWhatTheServiceTellsForDiagnosis) {
     const CommandResult result = get({"--all", "--json", "--device", sessionAtOnce()});
     EXPECT_EQ(result.exitCode, 0) << result;

@@ -17,6 +17,7 @@ namespace VexaTouch::Testing {
 namespace {
 
 using ::testing::AnyOf;
+using ::testing::EndsWith;
 using ::testing::StartsWith;
 
 constexpr std::array<std::string_view, 4> kStages = {"pipeline", "pipeline_done", "queue",
@@ -60,6 +61,34 @@ TEST_F(LatencyCommandTest, ServiceThatTakesNoReportsIsNotWaitedForForever) {
         (CommandResult{1, "",
                        "measuring with real-time priority, about 1 s ...\n"
                        "vexatouch latency: the service takes no reports; its log says why\n"}));
+}
+
+TEST_F(LatencyCommandTest, ServiceThatStopsTakingReportsIsNotWaitedForForever) {
+    setenv("VEXATOUCH_PLUGIN", VEXATOUCH_SAMPLE_PLUGINS "/TakesReportsOnce.so", 1);
+    const CommandResult result =
+        runCommand({"latency", "--count", "10"}, {}, Vexa::HostClock::system(),
+                   std::chrono::milliseconds(500));
+    EXPECT_EQ(result.exitCode, 1);
+    EXPECT_THAT(result.error,
+                EndsWith("vexatouch latency: the service takes no reports; its log says why\n"));
+}
+
+TEST_F(LatencyCommandTest, ARecordingIsMeasuredAsFarAsItGoes) {
+    const std::string session = folder.file("session.json", mixedSession().text());
+    const auto results = measurements(
+        {"--device", "recording:" + session, "--rate", "5000", "--priority", "normal"});
+    ASSERT_EQ(results.size(), 2U);
+    // Half of its reports without the reader, half with it.
+    EXPECT_EQ(number(results[0], "pipeline", "samples"), 62U);
+    EXPECT_EQ(number(results[1], "pipeline", "samples"), 62U);
+}
+
+TEST_F(LatencyCommandTest, ARecordingWithoutReportsCannotBeMeasured) {
+    const std::string empty = folder.file("empty.json", containerText({}));
+    EXPECT_EQ(
+        latency({"--device", "recording:" + empty}),
+        (CommandResult{1, "",
+                       "vexatouch latency: " + empty + ": holds 0 reports, too few to measure\n"}));
 }
 
 TEST_F(LatencyCommandTest, EachStageOfEachReportIsMeasured) {

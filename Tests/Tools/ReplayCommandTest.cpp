@@ -4,6 +4,7 @@
 #include "Tests/Support/FakeHostClock.h"
 #include "Tests/Tools/CommandRun.h"
 #include "Tests/Tools/RecordedSession.h"
+#include "Tests/Tools/VexatouchProgram.h"
 #include "Tools/Replay.h"
 #include "Tools/SettingKeys.h"
 
@@ -151,6 +152,18 @@ TEST_F(ReplayCommandTest, SettingsThatCannotBeAreUsageErrorsWithTheListOfKeys) {
     expectRefused("VirtualNormalizationFactors.23=1", "the index is not below 23");
     expectRefused("ActivationThreshold=abc", "the value is no JSON");
     expectRefused("ActivationThreshold", "KEY=VALUE is needed");
+}
+
+// What is opened next must not become the standard error.
+TEST_F(ReplayCommandTest, ResultsAreWholeWhenTheStandardErrorIsClosed) {
+    const std::string program = vexatouchProgram();
+    const std::string both = " replay --log Algs=debug '" + session + "' --trace '";
+    const std::string quiet = folder.path("quiet.jsonl");
+    const std::string closed = folder.path("closed.jsonl");
+    ASSERT_EQ(std::system((program + both + quiet + "' >/dev/null 2>/dev/null").c_str()), 0);
+    ASSERT_EQ(std::system((program + both + closed + "' >/dev/null 2>&-").c_str()), 0);
+    EXPECT_FALSE(contentOf(closed).empty());
+    EXPECT_EQ(contentOf(closed), contentOf(quiet));
 }
 
 TEST_F(ReplayCommandTest, AWrongSettingIsFoundBeforeTheFileIsOpened) {

@@ -78,7 +78,7 @@ TEST_F(SetCommandTest, AValueThatIsNoJsonIsRefused) {
     const CommandResult result = set({"Product", "grey"});
     EXPECT_EQ(result.exitCode, 2);
     EXPECT_THAT(result.error,
-                StartsWith("vexatouch set: set Product: the value is no JSON: grey (a string needs "
+                StartsWith("vexatouch set: Product: the value is no JSON: grey (a string needs "
                            "its quotes: '\"grey\"')\n"));
     EXPECT_EQ(set({"Product", ""}).exitCode, 2);
     EXPECT_EQ(set({"Product"}).exitCode, 2);

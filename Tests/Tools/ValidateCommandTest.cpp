@@ -65,6 +65,14 @@ TEST(ValidateCommandTest, ListNamesEveryCheck) {
               R"(else","time_limit_s":20})");
 }
 
+TEST(ValidateCommandTest, TheListTakesNoOtherArgument) {
+    EXPECT_EQ(runCommand({"validate", "--list", "--only", "nope"}),
+              (CommandResult{2, "",
+                             "vexatouch validate: --list lists all checks, --only has no place "
+                             "there\nTry 'vexatouch validate --help'.\n"}));
+    EXPECT_EQ(runCommand({"validate", "--list", "extra.so"}).exitCode, 2);
+}
+
 TEST(ValidateCommandTest, ChecksAreNamedOnceAndSaidInALine) {
     const std::vector<std::string> names = checkNames();
     EXPECT_EQ(std::set<std::string>(names.begin(), names.end()).size(), names.size());
