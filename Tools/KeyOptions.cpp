@@ -30,7 +30,9 @@ Host::KeyMap parseKeyMap(std::span<const std::string> texts) {
 std::unique_ptr<Host::SharedKeyboard> makeKeyboard(const Host::KeyMap& map,
                                                    std::string_view command, Streams& streams) {
     const char* named = std::getenv(kNodeVariable);
-    const std::string node = named == nullptr ? Host::VirtualKeyboard::kNode : named;
+    // An empty variable names nothing.
+    const bool isNamed = named != nullptr && *named != '\0';
+    const std::string node = isNamed ? named : Host::VirtualKeyboard::kNode;
     streams.error << "vexatouch " << command << ": ";
     try {
         auto keyboard = std::make_unique<Host::VirtualKeyboard>(map.keys(), node);
