@@ -37,16 +37,18 @@ elseif(CMAKE_SYSTEM_PROCESSOR STREQUAL "x86_64")
 endif()
 
 # vexa_package(<component> <package> SECTION <section> SUMMARY <line> ABOUT <text>
-#              [MACHINE all] [DEPENDS <dependencies>] [CONTROL <file>...] [OVERRIDES <file>])
+#              [MACHINE all] [DEPENDS <dependencies>] [RECOMMENDS <dependencies>] [CONTROL <file>...]
+#              [OVERRIDES <file>])
 # Sets CPack's variables of the component, and installs what each package has to have. The text is
 # without semicolons, which CPack takes for the end of an item.
 macro(vexa_package component name)
-    cmake_parse_arguments(arg "" "SECTION;SUMMARY;ABOUT;MACHINE;DEPENDS;OVERRIDES" "CONTROL" ${ARGN})
+    cmake_parse_arguments(arg "" "SECTION;SUMMARY;ABOUT;MACHINE;DEPENDS;RECOMMENDS;OVERRIDES" "CONTROL" ${ARGN})
     string(TOUPPER "${component}" upper)
     list(APPEND CPACK_COMPONENTS_ALL ${component})
     set(CPACK_DEBIAN_${upper}_PACKAGE_NAME "${name}")
     set(CPACK_DEBIAN_${upper}_PACKAGE_SECTION "${arg_SECTION}")
     set(CPACK_DEBIAN_${upper}_PACKAGE_DEPENDS "${arg_DEPENDS}")
+    set(CPACK_DEBIAN_${upper}_PACKAGE_RECOMMENDS "${arg_RECOMMENDS}")
     set(CPACK_DEBIAN_${upper}_DESCRIPTION "${arg_SUMMARY}\n${arg_ABOUT}")
     if(arg_CONTROL)
         set(CPACK_DEBIAN_${upper}_PACKAGE_CONTROL_EXTRA "${arg_CONTROL}")
@@ -76,6 +78,8 @@ vexa_package(runtime libvexaplatform1
 C interface: values, events, queues, run loops, devices, the log and trace
 points. One copy serves the whole process.
 "
+    # Loaded by dlopen, for the journal.
+    RECOMMENDS "libsystemd0"
     CONTROL "${VEXA_DEBIAN}/runtime/triggers" "${VEXA_DEBIAN}/runtime/symbols"
             "${VEXA_DEBIAN_MADE}/shlibs")
 vexa_package(development libvexaplatform-dev
