@@ -54,6 +54,7 @@ clean_root_mount() {
     # Not the machine's own /dev: what is installed here must find none of its devices.
     mount -t tmpfs -o mode=0755 none "$root/dev"
     for node in null zero full random urandom tty; do
+        [ -e "/dev/$node" ] || continue
         touch "$root/dev/$node"
         mount --bind "/dev/$node" "$root/dev/$node"
     done
@@ -71,7 +72,8 @@ clean_root_mount() {
         >"$root/etc/apt/apt.conf.d/00clean-root"
     printf '#!/bin/sh\nexit 101\n' >"$root/usr/sbin/policy-rc.d"
     chmod 755 "$root/usr/sbin/policy-rc.d"
-    cp -L /etc/resolv.conf "$root/etc/resolv.conf"
+    rm -f "$root/etc/resolv.conf"
+    cp -L /etc/resolv.conf "$root/etc/resolv.conf" || true
 }
 
 clean_root_install() {
@@ -106,7 +108,8 @@ clean_root_made() {
             clean_root_unshared bash -euo pipefail -c 'source "$1"; shift; root=$1; shift
                 clean_root_mount "$root"; clean_root_install "$root" "$@"' clean_root \
                 "$(realpath "${BASH_SOURCE[0]}")" "$work" "$@" >&2 &&
-            rm -f "$work/usr/sbin/policy-rc.d" "$work/etc/apt/apt.conf.d/00clean-root" &&
+            rm -f "$work/usr/sbin/policy-rc.d" "$work/etc/apt/apt.conf.d/00clean-root" \
+                "$work/etc/resolv.conf" &&
             tar -C "$work" --numeric-owner -cf "$kept.new" . &&
             mv "$kept.new" "$kept"
         rm -rf --one-file-system "$work"
