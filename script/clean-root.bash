@@ -3,6 +3,7 @@
 #   clean_root_possible            says "skipped" and returns 77 where no such system can be made
 #   clean_root_unshared SCRIPT...  runs the script again where its mounts and processes are its own: they
 #                                  are gone when it ends, however it ends
+#   clean_root_end                 ends that, and forgets what is half made; for a trap of EXIT
 #   clean_root_made PACKAGE...     makes the smallest Debian 12 with these packages, unless it is there, and
 #                                  names its archive
 #   clean_root FOLDER PACKAGE...   unpacks it into the folder
@@ -37,7 +38,19 @@ clean_root_possible() {
 }
 
 clean_root_unshared() {
-    unshare --mount --pid --fork --kill-child --mount-proc --propagation private "$@"
+    # Not in the foreground, where a signal would wait for its end.
+    unshare --mount --pid --fork --kill-child --mount-proc --propagation private "$@" <&0 &
+    clean_root_inner=$!
+    wait "$clean_root_inner"
+}
+
+clean_root_end() {
+    if [ -n "${clean_root_inner:-}" ]; then
+        kill -KILL "$clean_root_inner" 2>/dev/null || true
+    fi
+    if [ -n "${clean_root_making:-}" ]; then
+        rm -rf --one-file-system "$clean_root_making"
+    fi
 }
 
 in_root() {
@@ -93,8 +106,8 @@ clean_root_made() {
     mkdir -p "$clean_root_store"
     if [ ! -f "$base" ]; then
         # The lists of packages stay, so that apt there knows what can be had.
-        mmdebstrap --quiet --variant=minbase --skip=cleanup/apt/lists "$clean_root_suite" "$base.new" \
-            ${DEBIAN_MIRROR:+"$DEBIAN_MIRROR"} >&2 || return 1
+        mmdebstrap --quiet --format=tar --variant=minbase --skip=cleanup/apt/lists \
+            "$clean_root_suite" "$base.new" ${DEBIAN_MIRROR:+"$DEBIAN_MIRROR"} >&2 || return 1
         mv "$base.new" "$base"
     fi
     kept=$base
@@ -103,6 +116,7 @@ clean_root_made() {
     fi
     if [ ! -f "$kept" ]; then
         work=$(mktemp -d "$clean_root_store/making.XXXXXX")
+        clean_root_making=$work
         # shellcheck disable=SC2016
         tar -C "$work" -xpf "$base" &&
             clean_root_unshared bash -euo pipefail -c 'source "$1"; shift; root=$1; shift
