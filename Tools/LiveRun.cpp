@@ -3,6 +3,7 @@
 #include "Host/RegisteredDevice.h"
 #include "Platform/HostClock.h"
 #include "Platform/PropertyValue.h"
+#include "Platform/SignalsBlocked.h"
 #include "Shared/Util.h"
 #include "Tools/Failure.h"
 #include "Tools/FrameView.h"
@@ -11,6 +12,8 @@
 #include <algorithm>
 #include <array>
 #include <cstdio>
+#include <system_error>
+#include <thread>
 #include <utility>
 
 namespace VexaTouch::Tools {
@@ -36,6 +39,35 @@ std::string microseconds(double ns) {
 
 }  // namespace
 
+/// The thread that sees to the end of a session that has begun. However the run is left, the
+/// session is halted and no key is down when it is destroyed.
+class LiveRun::Keeper {
+public:
+    /// Throws Failure.
+    explicit Keeper(LiveRun& run) : run_(run) {
+        try {
+            const Vexa::SignalsBlocked blocked;
+            thread_ = std::thread([&run] { run.keep(); });
+        } catch (const std::system_error& error) {
+            run.session_.halt();
+            throw Failure(std::string("no thread that ends the run: ") + error.what());
+        }
+    }
+    ~Keeper() {
+        run_.enough_ = true;
+        run_.wake_.notify();
+        thread_.join();
+    }
+    Keeper(const Keeper&) = delete;
+    Keeper(Keeper&&) = delete;
+    Keeper& operator=(const Keeper&) = delete;
+    Keeper& operator=(Keeper&&) = delete;
+
+private:
+    LiveRun& run_;
+    std::thread thread_;
+};
+
 LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<ObservedDevice>& device,
                  LiveRunOptions options, SignalWatch& signals, const WakeUp& wake, Streams& streams)
     : device_(device),
@@ -44,7 +76,7 @@ LiveRun::LiveRun(const Host::PluginLibrary& library, const std::shared_ptr<Obser
       wake_(wake),
       streams_(streams),
       startNs_(Util::nanosecondsFromMachTime(nowTicks())),
-      inbox_(wake),
+      inbox_(work_, options_.eventRoom),
       watch_(*device, streams.patience),
       registration_(Host::registeredDevice(device)),
       session_(library, registration_.service(), [this](const Vexa::HidEvent& event) {
@@ -93,7 +125,7 @@ void LiveRun::installHooks() {
     hooks.onArrived = [this](std::span<const std::uint8_t> report, std::uint64_t ticks) {
         arrivals_.put(ticks);
         if (gaps_.see(report)) {
-            wake_.notify();
+            work_.notify();
         }
     };
     if (surface_) {
@@ -109,18 +141,7 @@ void LiveRun::run() {
         deadline_ = start + *options_.duration;
     }
     nextLook_ = start + watch_.interval();
-    if (surface_) {
-        screen_ = std::make_unique<LiveScreen>(streams_);
-    } else if (!options_.json) {
-        streams_.out << deliveredEventHeading() << std::flush;
-    }
-    for (handleWork(); !isOver(); handleWork()) {
-        waitForWork();
-    }
-    session_.halt();
-    if (keys_) {
-        keys_->releaseAll();
-    }
+    runToEnd();
     takeEvents();
     draw(true);
     screen_.reset();
@@ -138,27 +159,67 @@ void LiveRun::run() {
     if (stuck_) {
         throw Failure(ReportWatch::kFault);
     }
+    if (totals_.lost > 0) {
+        throw Failure(counted(totals_.lost, "event") +
+                      " could not be printed, because those before were not read quickly enough");
+    }
+}
+
+void LiveRun::runToEnd() {
+    const Keeper keeper(*this);
+    if (surface_) {
+        screen_ = std::make_unique<LiveScreen>(streams_);
+    } else if (!options_.json) {
+        streams_.out << deliveredEventHeading() << std::flush;
+    }
+    for (handleWork(); !halted_; handleWork()) {
+        endWhenEnough();
+        waitForWork();
+    }
+}
+
+void LiveRun::keep() {
+    while (!isOver()) {
+        waitForEnd();
+        lookAfterReports();
+        // Whatever it was, it may be something for the other as well.
+        work_.notify();
+    }
+    session_.halt();
+    if (keys_) {
+        keys_->releaseAll();
+    }
+    halted_ = true;
+    work_.notify();
 }
 
 bool LiveRun::isOver() const {
-    return finished_ || unplugged_ || quit_ || stuck_ || signals_.endWanted() ||
-           !streams_.out.good() || (options_.count && totals_.events >= *options_.count) ||
+    return finished_ || unplugged_ || enough_ || stuck_ || signals_.endWanted() ||
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
 
-void LiveRun::waitForWork() {
-    Time until = nextLook_;
-    if (deadline_) {
-        until = std::min(until, *deadline_);
-    }
-    if (screen_) {
-        until = std::min(until, nextDraw_);
-    }
-    if (nextGapTime_ && gaps_.gaps() != gapsTold_) {
-        until = std::min(until, *nextGapTime_);
-    }
+void LiveRun::waitForEnd() {
+    const Time until = deadline_ ? std::min(nextLook_, *deadline_) : nextLook_;
     if (wake_.wait(until, device_->hangUpDescriptor())) {
         unplugged_ = true;
+    }
+}
+
+void LiveRun::waitForWork() const {
+    std::optional<Time> until;
+    if (screen_) {
+        until = nextDraw_;
+    }
+    if (nextGapTime_ && gaps_.gaps() != gapsTold_) {
+        until = until ? std::min(*until, *nextGapTime_) : *nextGapTime_;
+    }
+    work_.wait(until);
+}
+
+void LiveRun::endWhenEnough() {
+    if (quit_ || !streams_.out.good() || (options_.count && totals_.events >= *options_.count)) {
+        enough_ = true;
+        wake_.notify();
     }
 }
 
@@ -172,7 +233,6 @@ void LiveRun::handleWork() {
     }
     tellOfGaps();
     writeRecordingOnWish();
-    lookAfterReports();
 }
 
 void LiveRun::lookAfterReports() {
@@ -202,7 +262,8 @@ std::string LiveRun::gapsText() const {
 }
 
 void LiveRun::takeEvents() {
-    for (const DeliveredEvent& event : inbox_.take()) {
+    const EventInbox::Taken taken = inbox_.take();
+    for (const DeliveredEvent& event : taken.events) {
         if (options_.count && totals_.events >= *options_.count) {
             return;
         }
@@ -211,6 +272,7 @@ void LiveRun::takeEvents() {
         totals_.latencyMostNs = std::max(totals_.latencyMostNs, event.latencyNs);
         print(event);
     }
+    totals_.lost += taken.lost;
 }
 
 void LiveRun::print(const DeliveredEvent& event) {

@@ -22,6 +22,7 @@
 
 #include <atomic>
 #include <chrono>
+#include <cstddef>
 #include <cstdint>
 #include <deque>
 #include <memory>
@@ -44,6 +45,8 @@ struct LiveRunOptions {
     /// What the gestures' keys are pressed on; null: nothing. It must outlive the run.
     Host::SharedKeyboard* keyboard = nullptr;
     Host::KeyMap keyMap = {};
+    /// Events that wait to be printed while nobody reads those before; further ones are lost.
+    std::size_t eventRoom = EventInbox::kUsualRoom;
 };
 
 /// A service run by a host from its first step to its last: a plug-in, a device and somebody who
@@ -53,8 +56,9 @@ struct LiveRunOptions {
 /// service takes no reports.
 ///
 /// The thread that runs it prints, draws and writes; the input thread and the device's player only
-/// ever leave things for it. Keys are pressed on the thread that delivers the events; none is down
-/// when run() returns.
+/// ever leave things for it. Keys are pressed on the thread that delivers the events. A further
+/// thread, which never writes, sees that the run is over, halts the session and releases the keys:
+/// so none stays down although the first waits for somebody who reads the output.
 class LiveRun {
 public:
     /// Walks the plug-in's life up to its event callback and gives it the settings. `signals` and
@@ -68,23 +72,35 @@ public:
     LiveRun& operator=(const LiveRun&) = delete;
     LiveRun& operator=(LiveRun&&) = delete;
 
-    /// Runs to the end, the whole teardown included. Once. Throws HostFailure and Failure.
+    /// Runs to the end, the whole teardown included. Once. Throws HostFailure and Failure, also
+    /// when the device was unplugged and when events were lost because nobody read those before.
     void run();
 
 private:
     using Time = std::chrono::steady_clock::time_point;
 
+    class Keeper;
+
     struct Totals {
         std::uint64_t events = 0;
+        std::uint64_t lost = 0;
         std::uint64_t latencySumNs = 0;
         std::uint64_t latencyMostNs = 0;
     };
 
     void installHooks();
+
+    // The keeper's thread.
+    void keep();
     [[nodiscard]] bool isOver() const;
-    void waitForWork();
+    void waitForEnd();
     void lookAfterReports();
+
+    // The thread that runs it.
+    void runToEnd();
+    void waitForWork() const;
     void handleWork();
+    void endWhenEnough();
     void takeEvents();
     void print(const DeliveredEvent& event);
     void handleKeys();
@@ -104,6 +120,7 @@ private:
     const WakeUp& wake_;
     Streams& streams_;
     std::uint64_t startNs_;
+    WakeUp work_;
     EventInbox inbox_;
     ArrivalTimes arrivals_;
     std::unique_ptr<LiveSurface> surface_;
@@ -114,12 +131,15 @@ private:
     FrameGaps gaps_;
     std::uint64_t gapsTold_ = 0;
     std::optional<Time> nextGapTime_;  // not before this is there a further line
-    std::optional<Time> deadline_;
     Time nextDraw_;
+    bool quit_ = false;
+    // The keeper's while it lives.
+    std::optional<Time> deadline_;
     ReportWatch watch_;
     Time nextLook_;
     bool stuck_ = false;
-    bool quit_ = false;
+    std::atomic<bool> enough_ = false;  // the thread that runs it has no more use for events
+    std::atomic<bool> halted_ = false;
     // Set by the device's threads.
     std::atomic<bool> finished_ = false;
     std::atomic<bool> unplugged_ = false;

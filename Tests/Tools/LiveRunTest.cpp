@@ -1,6 +1,8 @@
 #include "Tools/LiveRun.h"
 
+#include "Host/Keyboard.h"
 #include "Host/PluginLibrary.h"
+#include "Host/SharedKeyboard.h"
 #include "Platform/HostClock.h"
 #include "Tests/Support/FakeKeyboard.h"
 #include "Tests/Tools/CommandRun.h"
@@ -15,16 +17,23 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <unistd.h>
+
 #include <algorithm>
+#include <chrono>
+#include <csignal>
 #include <cstdint>
 #include <cstdlib>
 #include <filesystem>
 #include <functional>
+#include <future>
 #include <limits>
 #include <memory>
 #include <set>
 #include <sstream>
+#include <streambuf>
 #include <string>
+#include <system_error>
 #include <utility>
 #include <vector>
 
@@ -189,6 +198,164 @@ TEST_F(LiveRunTest, UnplugInAHoldReleasesItsKey) {
     unplugged = device.get();
     EXPECT_THROW(run(device), Tools::Failure);
     EXPECT_EQ(typed.take(), "+KEY_ASSISTANT | -KEY_ASSISTANT |");
+}
+
+/// Results that nobody reads: the first write ends when `until` is ready, or after so long that a
+/// test has failed.
+class UnreadOutput final : public std::streambuf {
+public:
+    explicit UnreadOutput(std::future<void> until) : until_(std::move(until)) {}
+
+    void waitUntilStuck() const { stuckNow_.wait(); }
+    /// Whether it was ready.
+    [[nodiscard]] bool wentOn() const { return wentOn_; }
+    [[nodiscard]] const std::string& text() const { return text_; }
+
+protected:
+    int_type overflow(int_type character) override {
+        const char byte = traits_type::to_char_type(character);
+        xsputn(&byte, 1);
+        return character;
+    }
+    std::streamsize xsputn(const char* text, std::streamsize length) override {
+        if (text_.empty()) {
+            stuck_.set_value();
+            wentOn_ = until_.wait_for(std::chrono::minutes(1)) == std::future_status::ready;
+        }
+        text_.append(text, static_cast<std::size_t>(length));
+        return length;
+    }
+
+private:
+    std::future<void> until_;
+    std::promise<void> stuck_;
+    std::shared_future<void> stuckNow_ = stuck_.get_future().share();
+    bool wentOn_ = false;
+    std::string text_;
+};
+
+/// A keyboard that tells of the first release.
+class ReleaseToldOf final : public Host::Keyboard {
+public:
+    explicit ReleaseToldOf(std::promise<void>& released) : released_(released) {}
+
+    [[nodiscard]] std::error_code press(Host::KeyCode) noexcept override { return {}; }
+    [[nodiscard]] std::error_code release(Host::KeyCode) noexcept override {
+        if (!std::exchange(told_, true)) {
+            released_.set_value();
+        }
+        return {};
+    }
+    [[nodiscard]] std::error_code synchronise() noexcept override { return {}; }
+
+private:
+    std::promise<void>& released_;
+    bool told_ = false;
+};
+
+struct UnreadRun {
+    bool keyWasReleased = false;  ///< while the output was stuck
+    std::string out;
+    std::string failure;
+};
+
+/// Runs up to the first hold, and when the output is stuck does what `end` does.
+UnreadRun runUnread(const std::vector<PlayedDevice::Frame>& frames, Tools::Streams like,
+                    const std::function<void(PlayedDevice&, const PlayedDevice::FrameSink&)>& end) {
+    std::promise<void> released;
+    UnreadOutput unread(released.get_future());
+    std::ostream results(&unread);
+    Tools::Streams streams{.in = like.in, .out = results, .error = like.error};
+    const auto keyboard =
+        std::make_unique<Host::SharedKeyboard>(std::make_unique<ReleaseToldOf>(released));
+    PlayedDevice* played = nullptr;
+    const auto hold = upToTheFirstHold(frames, [] {});
+    const auto device = std::make_shared<PlayedDevice>(
+        [&](const PlayedDevice::FrameSink& sink) {
+            hold(sink);
+            unread.waitUntilStuck();
+            end(*played, sink);
+        },
+        Tools::PlayedPace{.speed = kAsFastAsTaken}, Tools::SurfaceIdentity{},
+        Vexa::HostClock::system());
+    played = device.get();
+    const Tools::WakeUp wake;
+    Tools::SignalWatch signals(wake);
+    const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
+    Tools::LiveRun live(library, device, {.json = true, .keyboard = keyboard.get()}, signals, wake,
+                        streams);
+    UnreadRun result;
+    try {
+        live.run();
+    } catch (const Tools::Failure& failure) {
+        result.failure = failure.what();
+    }
+    result.keyWasReleased = unread.wentOn();
+    result.out = unread.text();
+    return result;
+}
+
+TEST_F(LiveRunTest, UnplugReleasesTheKeyWhileNobodyReadsTheOutput) {
+    const UnreadRun result =
+        runUnread(framesOf("holds"), streams,
+                  [](PlayedDevice& device, const PlayedDevice::FrameSink&) { device.unplug(); });
+    EXPECT_TRUE(result.keyWasReleased);
+    EXPECT_EQ(result.failure, "the device was unplugged");
+    EXPECT_THAT(result.out, HasSubstr("hold-start"));
+}
+
+TEST_F(LiveRunTest, SignalReleasesTheKeyWhileNobodyReadsTheOutput) {
+    PlayedDevice::Frame setting;
+    setting.type = PlayedDevice::Frame::Type::State;
+    setting.key = "Nothing";
+    setting.value = Vexa::PropertyValue::null();
+    const UnreadRun result = runUnread(framesOf("holds"), streams,
+                                       [&](PlayedDevice&, const PlayedDevice::FrameSink& sink) {
+                                           kill(getpid(), SIGTERM);
+                                           for (;;) {
+                                               sink(setting);  // throws when the device is closed
+                                           }
+                                       });
+    EXPECT_TRUE(result.keyWasReleased);
+    EXPECT_EQ(result.failure, "");
+    EXPECT_THAT(result.out, HasSubstr("hold-start"));
+}
+
+TEST_F(LiveRunTest, EventsBeyondTheRoomAreCountedAndTheRunFails) {
+    std::promise<void> finished;
+    UnreadOutput unread(finished.get_future());
+    std::ostream results(&unread);
+    Tools::Streams slow{.in = in, .out = results, .error = error};
+    // A setting has its turn when all reports before it have been handled.
+    auto frames = framesOf("taps");
+    PlayedDevice::Frame setting;
+    setting.type = PlayedDevice::Frame::Type::State;
+    setting.key = "Nothing";
+    setting.value = Vexa::PropertyValue::null();
+    const auto device = deviceThat([&](const PlayedDevice::FrameSink& sink) {
+        for (const auto& frame : frames) {
+            sink(frame);
+        }
+        sink(setting);
+        finished.set_value();
+    });
+    const Tools::WakeUp wake;
+    Tools::SignalWatch signals(wake);
+    const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
+    Tools::LiveRun live(library, device, {.json = true, .eventRoom = 3}, signals, wake, slow);
+    std::string failure;
+    try {
+        live.run();
+    } catch (const Tools::Failure& caught) {
+        failure = caught.what();
+    }
+    const std::size_t printed = linesOf(unread.text()).size();
+    const std::size_t all = Tools::readExpectedEvents(kExamples / "taps.events").size();
+    EXPECT_TRUE(unread.wentOn());
+    EXPECT_EQ(failure, std::to_string(all - printed) +
+                           " events could not be printed, because those before were not read "
+                           "quickly enough");
+    EXPECT_THAT(error.str(), HasSubstr(' ' + std::to_string(printed) + " events; latency"));
 }
 
 TEST_F(LiveRunTest, KeyboardThatIsTakenAwayIsToldOfOnceAndTheRunGoesOn) {
