@@ -1,7 +1,9 @@
 #include "Tools/LiveScreen.h"
 
 #include "Shared/Util.h"
+#include "Tools/FileDescriptor.h"
 
+#include <fcntl.h>
 #include <poll.h>
 #include <termios.h>
 #include <unistd.h>
@@ -125,11 +127,20 @@ char LiveScreen::pressedKey() {
 }
 
 void LiveScreen::abandon() noexcept {
-    if (cursorHidden) {
-        static_cast<void>(::write(STDOUT_FILENO, kShowCursor.data(), kShowCursor.size()) > 0);
-    }
     if (keyboardIsRaw) {
         tcsetattr(STDIN_FILENO, TCSANOW, &keyboardBefore);
+    }
+    if (!cursorHidden) {
+        return;
+    }
+    // Opened anew, since a descriptor that does not block is the shell's as well when it is ours.
+    // Without the right to do so, what has room is written.
+    const FileDescriptor unblocked(
+        ::open("/proc/self/fd/1", O_WRONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+    const int terminal = unblocked ? unblocked.get() : STDOUT_FILENO;
+    pollfd room{.fd = terminal, .events = POLLOUT, .revents = 0};
+    if (poll(&room, 1, 0) > 0 && (room.revents & POLLOUT) != 0) {
+        static_cast<void>(::write(terminal, kShowCursor.data(), kShowCursor.size()) > 0);
     }
 }
 

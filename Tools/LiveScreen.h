@@ -31,7 +31,7 @@ public:
     [[nodiscard]] std::uint64_t nowNs() const;
 
     /// Makes the terminal as it was, when the process ends without destroying the screen. Any
-    /// thread.
+    /// thread. Waits for nobody: where the terminal takes nothing more, the cursor stays hidden.
     static void abandon() noexcept;
 
     /// The signal that arrived and asks for an end, or 0.

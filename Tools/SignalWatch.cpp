@@ -1,5 +1,6 @@
 #include "Tools/SignalWatch.h"
 
+#include "Platform/SignalsBlocked.h"
 #include "Tools/Failure.h"
 #include "Tools/LiveScreen.h"
 
@@ -62,6 +63,9 @@ SignalWatch::SignalWatch(const WakeUp& wake) : wake_(wake) {
     sigaction(SIGPIPE, &ignore, &previousPipe_);
     sigaction(SIGXFSZ, &ignore, &previousFileSize_);
     try {
+        // All are blocked there: SIGTTOU would stop a process in the background that tidies its
+        // terminal up.
+        const Vexa::SignalsBlocked blocked;
         thread_ = std::thread([this] { watch(); });
     } catch (const std::system_error& error) {
         sigaction(SIGPIPE, &previousPipe_, nullptr);

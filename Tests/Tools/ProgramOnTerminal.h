@@ -2,6 +2,7 @@
 
 #include "Tests/Tools/VexatouchProgram.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <pty.h>
 #include <sys/ioctl.h>
@@ -12,6 +13,7 @@
 
 #include <csignal>
 #include <cstddef>
+#include <cstdlib>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -60,6 +62,14 @@ public:
         return true;
     }
 
+    /// The terminal takes nothing more of what the program writes, as after Ctrl-S.
+    void stopOutput() const {
+        const int terminal = open(ptsname(terminal_), O_RDWR | O_NOCTTY | O_CLOEXEC);
+        ASSERT_EQ(tcflow(terminal, TCOOFF), 0);
+        close(terminal);
+    }
+    void signal(int number) const { kill(process_, number); }
+
     void type(std::string_view keys) const {
         ASSERT_EQ(write(terminal_, keys.data(), keys.size()), static_cast<ssize_t>(keys.size()));
     }
@@ -67,6 +77,14 @@ public:
     /// Waits for the end and gives the status as waitpid does.
     int end() {
         readUntil("\xFF");
+        int status = 0;
+        waitpid(process_, &status, 0);
+        process_ = -1;
+        return status;
+    }
+
+    /// The same without reading what the program has written.
+    int wait() {
         int status = 0;
         waitpid(process_, &status, 0);
         process_ = -1;

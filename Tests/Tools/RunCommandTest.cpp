@@ -511,6 +511,18 @@ TEST_F(RunCommandTest, ShowIsTidiedByAnInterruptAndByTwo) {
     }
 }
 
+TEST_F(RunCommandTest, SecondSignalEndsShowOnATerminalThatTakesNothing) {
+    ProgramOnTerminal program({"run", "--show", "--seed", "1"});
+    ASSERT_TRUE(program.readUntil("region")) << program.output();
+    program.stopOutput();
+    // The end in order would write to the terminal.
+    program.signal(SIGINT);
+    program.signal(SIGTERM);
+    const int status = program.wait();
+    EXPECT_TRUE(WIFSIGNALED(status)) << status;
+    EXPECT_TRUE(program.keyboardIsAsBefore());
+}
+
 TEST_F(RunCommandTest, ShowPrintsLinesWhereThereIsNoTerminal) {
     const CommandResult result = run({"--show", "--device", asFastAsTaken("swipe")});
     EXPECT_EQ(result.exitCode, 0);
