@@ -65,6 +65,9 @@ vexa_status HidrawSource::getReport(vexa_report_type type, std::uint32_t reportI
 }
 
 Vexa::PropertyValue HidrawSource::property(const Vexa::PropertyValue& key) noexcept {
+    if (key.asString() == kReadsOnKey) {
+        return true;
+    }
     return device_.property(key);
 }
 

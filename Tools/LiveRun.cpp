@@ -7,6 +7,7 @@
 #include "Shared/Util.h"
 #include "Tools/Failure.h"
 #include "Tools/FrameView.h"
+#include "Tools/LastReports.h"
 #include "Tools/OutputFile.h"
 
 #include <algorithm>
@@ -159,7 +160,7 @@ void LiveRun::run() {
     if (stuck_) {
         throw Failure(ReportWatch::kFault);
     }
-    if (totals_.lost > 0) {
+    if (totals_.lost > 0 && streams_.out.good()) {
         throw Failure(counted(totals_.lost, "event") +
                       " could not be printed, because those before were not read quickly enough");
     }
@@ -185,6 +186,9 @@ void LiveRun::keep() {
         // Whatever it was, it may be something for the other as well.
         work_.notify();
     }
+    if (unplugged_) {
+        waitForLastReports();
+    }
     session_.halt();
     if (keys_) {
         keys_->releaseAll();
@@ -202,6 +206,13 @@ void LiveRun::waitForEnd() {
     const Time until = deadline_ ? std::min(nextLook_, *deadline_) : nextLook_;
     if (wake_.wait(until, device_->hangUpDescriptor())) {
         unplugged_ = true;
+    }
+}
+
+void LiveRun::waitForLastReports() {
+    LastReports last(*device_, session_, streams_.patience);
+    while (!last.areTaken() && !signals_.endWanted()) {
+        wake_.wait(std::chrono::steady_clock::now() + LastReports::kInterval);
     }
 }
 

@@ -51,9 +51,9 @@ struct LiveRunOptions {
 
 /// A service run by a host from its first step to its last: a plug-in, a device and somebody who
 /// looks at the events. Says when frames of the device were lost, at most once a second, and how
-/// many in the end. It ends when the device has played everything or is gone, after a time,
-/// after a number of events, at a signal, when nobody takes the events any more, or when the
-/// service takes no reports.
+/// many in the end. It ends when the device has played everything or is gone and what it had sent
+/// was handled, after a time, after a number of events, at a signal, when nobody takes the events
+/// any more, or when the service takes no reports.
 ///
 /// The thread that runs it prints, draws and writes; the input thread and the device's player only
 /// ever leave things for it. Keys are pressed on the thread that delivers the events. A further
@@ -94,6 +94,7 @@ private:
     void keep();
     [[nodiscard]] bool isOver() const;
     void waitForEnd();
+    void waitForLastReports();
     void lookAfterReports();
 
     // The thread that runs it.

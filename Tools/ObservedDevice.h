@@ -7,6 +7,7 @@
 #include <functional>
 #include <span>
 #include <string>
+#include <string_view>
 
 namespace VexaTouch::Tools {
 
@@ -37,6 +38,11 @@ struct DeviceHooks {
 /// A device of a command: one that is played or one that is there.
 class ObservedDevice : public Vexa::DeviceBackend {
 public:
+    /// A property that a live device has even after the unplug: a service that gets no value for it
+    /// has read the device to its end. Played devices do not have it, since they count what they
+    /// send.
+    static constexpr std::string_view kReadsOnKey = "VexaTouch.ReadsOn";
+
     /// While the device is closed, and no report is being handled.
     virtual void setHooks(DeviceHooks hooks) = 0;
 

@@ -206,14 +206,19 @@ void PlayedDevice::Player::waitUntilAllHandled() {
 void PlayedDevice::Player::send(std::span<const std::uint8_t> report) {
     // Counted before the reader can have handled it.
     device_.sent_.fetch_add(1);
-    while (!trySend(report)) {
-        if (!device_.pace_.lossless) {
-            device_.sent_.fetch_sub(1);
-            device_.dropped_.fetch_add(1);
-            return;
+    try {
+        while (!trySend(report)) {
+            if (!device_.pace_.lossless) {
+                device_.sent_.fetch_sub(1);
+                device_.dropped_.fetch_add(1);
+                return;
+            }
+            pause(POLLOUT, kForever);
+            throwIfStopping();
         }
-        pause(POLLOUT, kForever);
-        throwIfStopping();
+    } catch (...) {
+        device_.sent_.fetch_sub(1);
+        throw;
     }
 }
 

@@ -44,7 +44,8 @@ RecordRun::RecordRun(const Host::PluginLibrary& library,
       watch_(*device, streams.patience),
       noHoldBack_(!options_.holdBack),
       registration_(std::make_shared<TappedDevice>(device, tap_)),
-      session_(library, registration_.service(), std::move(sink)) {
+      session_(library, registration_.service(), std::move(sink)),
+      lastReports_(*device, session_, streams.patience) {
     installHooks();
     for (const Setting& setting : options_.settings) {
         if (!tap_->setProperty(session_, std::string(kPipelineDomain) + setting.key,
@@ -109,8 +110,8 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     return summary_;
 }
 
-bool RecordRun::isOver() const {
-    return finished_ || unplugged_ || stuck_ || signals_.endWanted() ||
+bool RecordRun::isOver() {
+    return finished_ || stuck_ || signals_.endWanted() || (unplugged_ && lastReports_.areTaken()) ||
            (options_.count && summary_.reports >= *options_.count) ||
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
@@ -127,7 +128,10 @@ void RecordRun::waitForWork() {
     if (const auto due = stream_->syncDue()) {
         noLaterThan(*due);
     }
-    if (wake_.wait(until, device_->hangUpDescriptor())) {
+    if (unplugged_) {
+        noLaterThan(std::chrono::steady_clock::now() + LastReports::kInterval);
+        wake_.wait(until);
+    } else if (wake_.wait(until, device_->hangUpDescriptor())) {
         unplugged_ = true;
     }
 }

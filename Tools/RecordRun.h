@@ -5,6 +5,7 @@
 #include "Platform/DeviceBackend.h"
 #include "Tools/FrameFeed.h"
 #include "Tools/InputTap.h"
+#include "Tools/LastReports.h"
 #include "Tools/ObservedDevice.h"
 #include "Tools/RecordingStream.h"
 #include "Tools/ReportWatch.h"
@@ -43,9 +44,9 @@ struct RecordSummary {
 };
 
 /// A service with a device of its own whose every input goes into a file, for as long as that
-/// takes. It ends when the device has played everything or is gone, after a time, after a number
-/// of reports, at a signal, when the file cannot be written any more, or when the service takes no
-/// reports.
+/// takes. It ends when the device has played everything or is gone and what it had sent is taken,
+/// after a time, after a number of reports, at a signal, when the file cannot be written any more,
+/// or when the service takes no reports.
 ///
 /// The thread that runs it writes; the input thread and the device's player never wait for it.
 class RecordRun {
@@ -71,9 +72,10 @@ private:
     using Time = std::chrono::steady_clock::time_point;
 
     void installHooks();
-    [[nodiscard]] bool isOver() const;
+    [[nodiscard]] bool isOver();
     void waitForWork();
     void lookAfterReports();
+    void answerUserSignal();
     bool takeFrames();
     void holdBack() noexcept;
     void endHoldBack() noexcept;
@@ -106,6 +108,7 @@ private:
     std::atomic<bool> unplugged_ = false;
     Vexa::DeviceRegistration registration_;
     Host::HostSession session_;
+    LastReports lastReports_;
 };
 
 }  // namespace VexaTouch::Tools

@@ -43,15 +43,19 @@ std::string example(const std::string& name) {
 }
 
 /// The reports of a recording in their order.
-std::vector<Bytes> reportsOf(const std::string& name) {
+std::vector<Bytes> reportsIn(const std::string& file) {
     Tools::Streams streams{.in = std::cin, .out = std::cout, .error = std::cerr};
     std::vector<Bytes> reports;
-    for (const auto& frame : Tools::readRecording(example(name), streams).frames) {
+    for (const auto& frame : Tools::readRecording(file, streams).frames) {
         if (frame.type == PipelineRecording::Frame::Type::InputReport) {
             reports.emplace_back(frame.report.begin(), frame.report.end());
         }
     }
     return reports;
+}
+
+std::vector<Bytes> reportsOf(const std::string& name) {
+    return reportsIn(example(name));
 }
 
 /// What happened: each line from its frame number on.
@@ -219,6 +223,38 @@ TEST_F(HidrawCommandsTest, LiveEventsEqualThoseOfTheReplay) {
         EXPECT_EQ(result.exitCode, 1);
         EXPECT_THAT(result.error, AllOf(HasSubstr(" reports read, "),
                                         EndsWith("vexatouch run: the device was unplugged\n")));
+    }
+}
+
+TEST_F(HidrawCommandsTest, RunTakesWhatWasSentJustBeforeTheUnplug) {
+    for (int round = 0; round < 20; ++round) {
+        devices_.plug(0);
+        auto running = start({"run", "--device", "hidraw", "--json"});
+        feed({image(1)});
+        std::vector<Bytes> last;
+        for (std::uint32_t number = 2; number < 62; ++number) last.push_back(image(number));
+        devices_.sendAndUnplug(0, last);
+        const CommandResult result = running.get();
+        EXPECT_EQ(result, (CommandResult{1, "",
+                                         "61 reports read, 0 events\nvexatouch run: the device was "
+                                         "unplugged\n"}));
+    }
+}
+
+TEST_F(HidrawCommandsTest, RecordTakesWhatWasSentJustBeforeTheUnplug) {
+    const TemporaryFolder folder;
+    for (int round = 0; round < 20; ++round) {
+        devices_.plug(0);
+        const std::string file = folder.path("session" + std::to_string(round) + ".json");
+        auto running = start({"record", file, "--device", "hidraw"});
+        std::vector<Bytes> sent = {image(1)};
+        feed(sent);
+        std::vector<Bytes> last;
+        for (std::uint32_t number = 2; number < 62; ++number) last.push_back(image(number));
+        sent.insert(sent.end(), last.begin(), last.end());
+        devices_.sendAndUnplug(0, std::move(last));
+        EXPECT_EQ(running.get().exitCode, 1);
+        EXPECT_EQ(reportsIn(file), sent);
     }
 }
 

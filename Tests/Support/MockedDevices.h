@@ -15,8 +15,10 @@
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <deque>
 #include <filesystem>
 #include <iostream>
+#include <iterator>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -100,6 +102,8 @@ public:
         device->handler = umockdev_ioctl_base_new();
         g_signal_connect(device->handler, "handle-ioctl", G_CALLBACK(&MockedDevices::answer),
                          device.get());
+        g_signal_connect(device->handler, "handle-read", G_CALLBACK(&MockedDevices::give),
+                         device.get());
         require(umockdev_testbed_attach_ioctl(testbed_, nodeOf(number).c_str(), device->handler,
                                               &error) != 0,
                 error);
@@ -110,6 +114,17 @@ public:
     /// Sends a further event.
     void announce(unsigned number, const char* action) {
         umockdev_testbed_uevent(testbed_, devices_.at(number)->sysPath.c_str(), action);
+    }
+    /// Sends the reports and pulls the plug before anybody can have read one: as from a device of
+    /// the kernel, reads give these, and fail afterwards.
+    void sendAndUnplug(unsigned number, std::vector<std::vector<std::uint8_t>> reports) {
+        Device& device = *devices_.at(number);
+        {
+            const std::lock_guard lock(device.mutex);
+            device.left.assign(std::make_move_iterator(reports.begin()),
+                               std::make_move_iterator(reports.end()));
+        }
+        unplug(number);
     }
     /// Pulls the plug: readers hang up, ioctls fail, the folders in /sys go, then comes the event.
     void unplug(unsigned number, bool announced = true) {
@@ -174,6 +189,7 @@ private:
         bool holdNext = false;
         std::map<std::uint8_t, MockedAnswer> features;
         std::vector<std::vector<std::uint8_t>> written;
+        std::deque<std::vector<std::uint8_t>> left;  ///< to be read after the unplug
         std::binary_semaphore held{0};
         UMockdevIoctlClient* heldClient = nullptr;
     };
@@ -247,6 +263,25 @@ private:
             }
         }
         complete(device, client);
+        return TRUE;
+    }
+
+    /// Of the same thread: what is left to be read. The terminal gives all else.
+    static gboolean give(UMockdevIoctlBase* /*handler*/, UMockdevIoctlClient* client,
+                         gpointer context) {
+        Device& device = *static_cast<Device*>(context);
+        const std::lock_guard lock(device.mutex);
+        if (!device.gone) return FALSE;
+        if (device.left.empty()) {
+            umockdev_ioctl_client_complete(client, -1, EIO);
+            return TRUE;
+        }
+        const std::vector<std::uint8_t> report = std::move(device.left.front());
+        device.left.pop_front();
+        UMockdevIoctlData* const room = umockdev_ioctl_client_get_arg(client);
+        umockdev_ioctl_data_update(room, 0, const_cast<guint8*>(report.data()),
+                                   static_cast<int>(report.size()));
+        umockdev_ioctl_client_complete(client, static_cast<glong>(report.size()), 0);
         return TRUE;
     }
 

@@ -13,6 +13,7 @@
 #include <gmock/gmock.h>
 
 #include <algorithm>
+#include <cstddef>
 #include <cstdint>
 #include <cstdlib>
 #include <filesystem>
@@ -252,7 +253,13 @@ TEST_F(RecordRunTest, UnpluggedDeviceLeavesAWholeFile) {
     } catch (const Failure& failure) {
         EXPECT_STREQ(failure.what(), "the device was unplugged");
     }
-    EXPECT_THAT(framesIn(file), Not(IsEmpty()));
+    const auto played = Testing::reportsOf(frames);
+    const auto kept = Testing::reportsOf(framesIn(file));
+    ASSERT_GE(played.size(), kept.size());
+    EXPECT_EQ(kept, decltype(kept)(played.begin(),
+                                   played.begin() + static_cast<std::ptrdiff_t>(kept.size())));
+    EXPECT_EQ(kept.size(), device->sent());
+    EXPECT_THAT(kept, Not(IsEmpty()));
 }
 
 }  // namespace
