@@ -23,7 +23,7 @@ constexpr unsigned kNewFileMode = 0666;  // less the process's mask
 }
 
 /// A descriptor: of a regular file, or of what is written in sequence.
-class DescriptorTarget final : public AppendTarget {
+class DescriptorTarget : public AppendTarget {
 public:
     DescriptorTarget(FileDescriptor descriptor, bool isRegular) noexcept
         : descriptor_(std::move(descriptor)), isRegular_(isRegular) {}
@@ -63,6 +63,70 @@ public:
 private:
     FileDescriptor descriptor_;
     bool isRegular_;
+};
+
+/// A regular file that was made or was empty.
+class NewFile final : public DescriptorTarget {
+public:
+    NewFile(FileDescriptor descriptor, std::string path, bool wasMade) noexcept
+        : DescriptorTarget(std::move(descriptor), true),
+          path_(std::move(path)),
+          wasMade_(wasMade) {}
+    ~NewFile() override {
+        if (isKept_) {
+            return;
+        }
+        if (wasMade_) {
+            ::unlink(path_.c_str());
+        } else {
+            static_cast<void>(::truncate(path_.c_str(), 0) == 0);
+        }
+    }
+    NewFile(const NewFile&) = delete;
+    NewFile(NewFile&&) = delete;
+    NewFile& operator=(const NewFile&) = delete;
+    NewFile& operator=(NewFile&&) = delete;
+
+    int keep() noexcept override {
+        isKept_ = true;
+        return 0;
+    }
+
+private:
+    const std::string path_;
+    const bool wasMade_;
+    bool isKept_ = false;
+};
+
+/// A new file beside the old one, whose name it takes when it is kept.
+class ReplacingFile final : public DescriptorTarget {
+public:
+    ReplacingFile(FileDescriptor descriptor, std::string temporary, std::string path) noexcept
+        : DescriptorTarget(std::move(descriptor), true),
+          temporary_(std::move(temporary)),
+          path_(std::move(path)) {}
+    ~ReplacingFile() override {
+        if (!isKept_) {
+            ::unlink(temporary_.c_str());
+        }
+    }
+    ReplacingFile(const ReplacingFile&) = delete;
+    ReplacingFile(ReplacingFile&&) = delete;
+    ReplacingFile& operator=(const ReplacingFile&) = delete;
+    ReplacingFile& operator=(ReplacingFile&&) = delete;
+
+    int keep() noexcept override {
+        if (!isKept_ && ::rename(temporary_.c_str(), path_.c_str()) != 0) {
+            return errno;
+        }
+        isKept_ = true;
+        return 0;
+    }
+
+private:
+    const std::string temporary_;
+    const std::string path_;
+    bool isKept_ = false;
 };
 
 /// The result stream. Each write is there for its reader when it returns.
@@ -111,12 +175,7 @@ std::unique_ptr<AppendTarget> replaceFile(const std::string& path, const struct 
     }
     // Best effort: the file stays as readable as it was.
     static_cast<void>(::fchmod(descriptor.get(), old.st_mode & 07777U) == 0);
-    if (::rename(name.c_str(), target.c_str()) != 0) {
-        const int reason = errno;
-        ::unlink(name.c_str());
-        fail(path, reason);
-    }
-    return std::make_unique<DescriptorTarget>(std::move(descriptor), true);
+    return std::make_unique<ReplacingFile>(std::move(descriptor), std::move(name), target);
 }
 
 }  // namespace
@@ -129,7 +188,7 @@ std::unique_ptr<AppendTarget> openAppendTarget(const std::string& path, bool rep
     FileDescriptor made(
         ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNewFileMode));
     if (made) {
-        return std::make_unique<DescriptorTarget>(std::move(made), true);
+        return std::make_unique<NewFile>(std::move(made), path, true);
     }
     const int reason = errno;
     struct stat old{};
@@ -148,7 +207,10 @@ std::unique_ptr<AppendTarget> openAppendTarget(const std::string& path, bool rep
     if (!opened) {
         fail(path, errno);
     }
-    return std::make_unique<DescriptorTarget>(std::move(opened), S_ISREG(old.st_mode));
+    if (S_ISREG(old.st_mode)) {
+        return std::make_unique<NewFile>(std::move(opened), path, false);
+    }
+    return std::make_unique<DescriptorTarget>(std::move(opened), false);
 }
 
 }  // namespace VexaTouch::Tools

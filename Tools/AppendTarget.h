@@ -35,6 +35,9 @@ public:
     virtual Result write(std::uint64_t offset, std::string_view text) noexcept = 0;
     /// Cuts everything from there on off.
     virtual int cut(std::uint64_t offset) noexcept = 0;
+    /// To be called once what was written is worth a file: until then a target that is destroyed
+    /// leaves everything as it was before it was opened.
+    virtual int keep() noexcept { return 0; }
     /// Returns when what was written would survive the machine's end.
     virtual int sync() noexcept = 0;
     virtual int close() noexcept = 0;
@@ -43,8 +46,9 @@ public:
 /// A file that is open to be written from its beginning, "-" for the result stream.
 ///
 /// A regular file appears at once, empty. One that is there already and not empty is refused,
-/// unless `replace`: then a new file takes its name, and who has the old one open keeps it. What is
-/// no regular file (a pipe, a device) is written as it is. Throws Failure with the name and why.
+/// unless `replace`: then a new file takes its name when it is kept, and who has the old one open
+/// keeps that. What is no regular file (a pipe, a device) is written as it is. Throws Failure with
+/// the name and why.
 std::unique_ptr<AppendTarget> openAppendTarget(const std::string& path, bool replace,
                                                Streams& streams);
 

@@ -46,6 +46,7 @@ void RecordingStream::add(const RecordedFrame& frame) {
 void RecordingStream::flush() {
     if (!ends_.empty()) {
         write(target_->isRewritable());
+        keepTarget();
     }
     syncIfDue();
 }
@@ -54,6 +55,7 @@ void RecordingStream::finish() {
     if (!ends_.empty() || !target_->isRewritable()) {
         write(true);
     }
+    keepTarget();
     isDead_ = true;
     if (const int error = target_->sync(); error != 0) {
         fail(error);
@@ -88,6 +90,9 @@ void RecordingStream::write(bool withClosing) {
     if (result.error != 0) {
         isDead_ = true;
         saveWhatFits(result.written);
+        if (frames_ > 0) {
+            keepTarget();
+        }
         fail(result.error);
     }
     end_ += length;
@@ -95,6 +100,13 @@ void RecordingStream::write(bool withClosing) {
     isNew_ = true;
     text_.clear();
     ends_.clear();
+}
+
+void RecordingStream::keepTarget() {
+    if (const int error = target_->keep(); error != 0) {
+        isDead_ = true;
+        fail(error);
+    }
 }
 
 // Cuts the file behind the last frame that was written whole and has room for the brackets. Where

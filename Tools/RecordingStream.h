@@ -25,7 +25,8 @@ namespace VexaTouch::Tools {
 /// pipe) gets its closing brackets at the end.
 ///
 /// When the disk is full, or a write fails otherwise, the file is brought back to the last frame
-/// that has room together with the brackets. One thread.
+/// that has room together with the brackets. A file that gets no frame at all leaves what was there
+/// before, unless it is finished. One thread.
 class RecordingStream {
 public:
     using Clock = std::chrono::steady_clock;
@@ -35,7 +36,7 @@ public:
     /// Writes the beginning. Throws Failure.
     RecordingStream(std::unique_ptr<AppendTarget> target, std::string name,
                     std::optional<std::chrono::nanoseconds> syncEvery = std::nullopt);
-    /// What was written stays as it is.
+    /// What was written stays as it is, if there are frames.
     ~RecordingStream();
     RecordingStream(const RecordingStream&) = delete;
     RecordingStream(RecordingStream&&) = delete;
@@ -63,6 +64,7 @@ private:
     [[nodiscard]] std::string_view closing() const noexcept;
     [[nodiscard]] std::uint64_t closingBytes() const noexcept;
     void write(bool withClosing);
+    void keepTarget();
     void saveWhatFits(std::size_t written) noexcept;
     void syncIfDue();
     [[noreturn]] void fail(int error) const;

@@ -68,6 +68,9 @@ TEST_F(AppendTargetTest, FileThatIsThereIsKeptUnlessToBeReplaced) {
     std::filesystem::create_hard_link(path, other);
     const auto target = open(path, true);
     target->write(0, "new");
+    EXPECT_EQ(contentOf(path), "precious");
+    EXPECT_EQ(target->keep(), 0);
+    EXPECT_EQ(target->keep(), 0);
     EXPECT_EQ(contentOf(path), "new");
     EXPECT_EQ(contentOf(other), "precious");
     struct stat status{};
@@ -80,14 +83,39 @@ TEST_F(AppendTargetTest, LinkKeepsPointingWhereItPoints) {
     const std::string path = folder.file("old", "precious");
     const std::string link = folder.path("link");
     std::filesystem::create_symlink("old", link);
-    open(link, true)->write(0, "new");
+    const auto target = open(link, true);
+    target->write(0, "new");
+    EXPECT_EQ(target->keep(), 0);
     EXPECT_TRUE(std::filesystem::is_symlink(link));
     EXPECT_EQ(contentOf(path), "new");
 }
 
 TEST_F(AppendTargetTest, EmptyFileIsTaken) {
     const std::string path = folder.file("empty", "");
-    open(path)->write(0, "new");
+    const auto target = open(path);
+    target->write(0, "new");
+    EXPECT_EQ(target->keep(), 0);
+    EXPECT_EQ(contentOf(path), "new");
+}
+
+TEST_F(AppendTargetTest, WhatIsNotKeptLeavesEverythingAsItWas) {
+    const std::string old = folder.file("old", "precious");
+    const std::string empty = folder.file("empty", "");
+    for (const std::string& path : {old, empty, folder.path("none")}) {
+        open(path, true)->write(0, "new");
+    }
+    EXPECT_EQ(contentOf(old), "precious");
+    EXPECT_EQ(contentOf(empty), "");
+    EXPECT_THAT(folder.names(), ElementsAre("empty", "old"));
+}
+
+TEST_F(AppendTargetTest, NewFileStaysWhenItIsKept) {
+    const std::string path = folder.path("new");
+    {
+        const auto target = open(path);
+        target->write(0, "new");
+        EXPECT_EQ(target->keep(), 0);
+    }
     EXPECT_EQ(contentOf(path), "new");
 }
 

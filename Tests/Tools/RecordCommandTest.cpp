@@ -221,6 +221,19 @@ TEST_F(RecordCommandTest, FullDiskEndsItWithAWholeFile) {
                           "frames are safe in it\n"));
 }
 
+TEST_F(RecordCommandTest, DiskWithoutRoomForAFrameLeavesTheOldRecording) {
+    const std::string path = folder.file("session.json", "precious");
+    const std::string errors = folder.path("errors");
+    const std::string line = "(ulimit -f 0; exec '" + std::string(vexatouchProgram()) +
+                             "' record '" + path + "' --force --device '" + asFastAsTaken("mixed") +
+                             "') 2>&1 | cat > '" + errors + "'";
+    ASSERT_NE(std::system(("bash -c \"" + line + "\"").c_str()), -1);
+    EXPECT_EQ(contentOf(errors), "vexatouch record: " + path +
+                                     ": cannot write: File too large; 0 frames are safe in it\n");
+    EXPECT_EQ(contentOf(path), "precious");
+    EXPECT_THAT(folder.names(), ElementsAre("errors", "session.json"));
+}
+
 TEST_F(RecordCommandTest, NobodyReadingThePipeEndsItInOrder) {
     ProgramRun program(endless("-"));
     ASSERT_TRUE(program.readOutUntil("InputReport"));

@@ -1,5 +1,6 @@
 #include "Tools/RecordRun.h"
 
+#include "Host/HostFailure.h"
 #include "Tests/Support/PrintPropertyValue.h"
 #include "Tests/Tools/CommandRun.h"
 #include "Tests/Tools/DeviceReader.h"
@@ -260,6 +261,25 @@ TEST_F(RecordRunTest, UnpluggedDeviceLeavesAWholeFile) {
                                    played.begin() + static_cast<std::ptrdiff_t>(kept.size())));
     EXPECT_EQ(kept.size(), device->sent());
     EXPECT_THAT(kept, Not(IsEmpty()));
+}
+
+/// It cannot be opened.
+class ClosedDevice final : public PlayedDevice {
+public:
+    ClosedDevice()
+        : PlayedDevice([](const FrameSink&) {}, {}, SurfaceIdentity{}, Vexa::HostClock::system()) {}
+    vexa_status open(std::uint32_t, int&) noexcept override { return VEXA_STATUS_GONE; }
+};
+
+TEST_F(RecordRunTest, DeviceThatDoesNotOpenLeavesWhatWasThere) {
+    const std::string old = folder.file("old.json", "precious");
+    for (const std::string& file : {old, folder.path("new.json")}) {
+        EXPECT_THROW(
+            record(std::make_shared<ClosedDevice>(), {}, openAppendTarget(file, true, streams)),
+            Host::HostFailure);
+    }
+    EXPECT_EQ(Testing::contentOf(old), "precious");
+    EXPECT_THAT(folder.names(), ::testing::ElementsAre("old.json"));
 }
 
 }  // namespace
