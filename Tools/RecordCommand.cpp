@@ -109,10 +109,13 @@ std::string counted(std::uint64_t count, std::string_view what) {
     return std::to_string(count) + ' ' + std::string(what) + (count == 1 ? "" : "s");
 }
 
-/// The exit status.
+/// The exit status. What a file holds that could not be written on, its failure says.
 int printSummary(const RecordingStream& stream, const RecordSummary& summary, Streams& streams) {
-    streams.error << stream.name() << ": " << counted(summary.reports, "report") << " and "
-                  << counted(summary.settings, "setting") << ", " << stream.bytes() << " bytes\n";
+    if (stream.isFinished()) {
+        streams.error << stream.name() << ": " << counted(summary.reports, "report") << " and "
+                      << counted(summary.settings, "setting") << ", " << stream.bytes()
+                      << " bytes\n";
+    }
     const FrameGap& lost = summary.lost;
     if (lost == FrameGap{}) {
         return kExitSuccess;
@@ -162,8 +165,13 @@ int runRecord(const Arguments& arguments, Streams& streams) {
     // Last, so that nothing that fails before leaves a file or replaces one.
     RecordingStream stream(openAppendTarget(file, arguments.given("--force"), streams),
                            file == "-" ? "standard output" : file, syncEvery);
-    const RecordSummary summary = run.run(stream);
-    return printSummary(stream, summary, streams);
+    try {
+        run.run(stream);
+    } catch (const Failure&) {
+        printSummary(stream, run.summary(), streams);
+        throw;
+    }
+    return printSummary(stream, run.summary(), streams);
 }
 
 }  // namespace

@@ -67,6 +67,8 @@ public:
     /// HostFailure and Failure, also when the device was unplugged; the stream is finished then as
     /// far as it can be.
     RecordSummary run(RecordingStream& stream);
+    /// What went into the stream, also when run() threw.
+    [[nodiscard]] const RecordSummary& summary() const noexcept { return summary_; }
 
 private:
     using Time = std::chrono::steady_clock::time_point;

@@ -63,6 +63,7 @@ void RecordingStream::finish() {
     if (const int error = target_->close(); error != 0) {
         fail(error);
     }
+    isFinished_ = true;
 }
 
 std::optional<RecordingStream::Clock::time_point> RecordingStream::syncDue() const noexcept {

@@ -59,6 +59,7 @@ public:
     /// Bytes of the file.
     [[nodiscard]] std::uint64_t bytes() const noexcept { return end_ + closingBytes(); }
     [[nodiscard]] const std::string& name() const noexcept { return name_; }
+    [[nodiscard]] bool isFinished() const noexcept { return isFinished_; }
 
 private:
     [[nodiscard]] std::string_view closing() const noexcept;
@@ -78,6 +79,7 @@ private:
     std::uint64_t end_ = 0;          // of the last frame in the file
     std::uint64_t frames_ = 0;       // in the file
     bool isDead_ = false;
+    bool isFinished_ = false;
     bool isNew_ = false;  // something was written since the last sync
     Clock::time_point nextSync_;
 };

@@ -253,8 +253,13 @@ TEST_F(HidrawCommandsTest, RecordTakesWhatWasSentJustBeforeTheUnplug) {
         for (std::uint32_t number = 2; number < 62; ++number) last.push_back(image(number));
         sent.insert(sent.end(), last.begin(), last.end());
         devices_.sendAndUnplug(0, std::move(last));
-        EXPECT_EQ(running.get().exitCode, 1);
+        const CommandResult result = running.get();
         EXPECT_EQ(reportsIn(file), sent);
+        EXPECT_EQ(result, (CommandResult{1, "",
+                                         file + ": 61 reports and 27 settings, " +
+                                             std::to_string(contentOf(file).size()) +
+                                             " bytes\nvexatouch record: the device was "
+                                             "unplugged\n"}));
     }
 }
 
