@@ -3,13 +3,13 @@
 
 #include "Tools/CommandTexts.h"
 #include "Tools/Failure.h"
+#include "Tools/FaultKeeper.h"
 
 #include "VexaVersion.h"
 
 #include <CLI/CLI.hpp>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstring>
 #include <exception>
 #include <memory>
@@ -89,18 +89,18 @@ std::string unexpected(const std::vector<std::string>& left) {
 }
 
 // Results that did not reach their destination are a failure like any other.
-int flushed(Streams& streams, std::string_view command, int exitCode) {
-    errno = 0;
+int flushed(Streams& streams, const FaultKeeper& fault, std::string_view command, int exitCode) {
     streams.out.flush();
     if (!streams.out.good()) {
+        const int error = fault.error();
         streams.error << kProgram << ' ' << command << ": cannot write the results: "
-                      << (errno != 0 ? std::strerror(errno) : "output stream failed") << '\n';
+                      << (error != 0 ? std::strerror(error) : "output stream failed") << '\n';
         return exitCode == kExitSuccess ? kExitFailure : exitCode;
     }
     return exitCode;
 }
 
-int runGlobal(std::span<const std::string> arguments, Streams& streams) {
+int runGlobal(std::span<const std::string> arguments, Streams& streams, const FaultKeeper& fault) {
     CLI::App app;
     app.set_help_flag("-h,--help");
     const CLI::Option* version = app.add_flag("--version");
@@ -110,7 +110,7 @@ int runGlobal(std::span<const std::string> arguments, Streams& streams) {
         app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
     } catch (const CLI::CallForHelp&) {
         streams.out << overviewText();
-        return flushed(streams, "--help", kExitSuccess);
+        return flushed(streams, fault, "--help", kExitSuccess);
     } catch (const CLI::ExtrasError&) {
         return usageError(streams, "", unexpected(app.remaining()));
     } catch (const CLI::ParseError& error) {
@@ -125,16 +125,17 @@ int runGlobal(std::span<const std::string> arguments, Streams& streams) {
     } else {
         return usageError(streams, "", "a command is required: " + commandNames());
     }
-    return flushed(streams, arguments.front(), kExitSuccess);
+    return flushed(streams, fault, arguments.front(), kExitSuccess);
 }
 
 }  // namespace
 
 int CommandLine::run(std::span<const std::string> arguments, Streams& streams) {
     std::string_view running;
+    FaultKeeper fault(streams.out);
     try {
         if (arguments.empty() || arguments.front().starts_with('-')) {
-            return runGlobal(arguments, streams);
+            return runGlobal(arguments, streams, fault);
         }
         const Command* command = findCommand(arguments.front());
         if (command == nullptr) {
@@ -149,7 +150,7 @@ int CommandLine::run(std::span<const std::string> arguments, Streams& streams) {
             parser->parse(std::vector<std::string>(rest.rbegin(), rest.rend()));
         } catch (const CLI::CallForHelp&) {
             streams.out << helpText(*command);
-            return flushed(streams, running, kExitSuccess);
+            return flushed(streams, fault, running, kExitSuccess);
         } catch (const CLI::ExtrasError&) {
             return usageError(streams, running, unexpected(parser->remaining()));
         } catch (const CLI::ParseError& error) {
@@ -169,7 +170,7 @@ int CommandLine::run(std::span<const std::string> arguments, Streams& streams) {
         for (const PositionalEntry& positional : command->positionals) {
             take(positional.name, {});
         }
-        return flushed(streams, running, command->run(parsed, streams));
+        return flushed(streams, fault, running, command->run(parsed, streams));
     } catch (const UsageError& error) {
         return usageError(streams, running, error.what());
     } catch (const std::bad_alloc&) {

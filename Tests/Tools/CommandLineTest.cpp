@@ -280,7 +280,7 @@ TEST(CommandLineTest, TheProgramItselfReadsPrintsAndExits) {
     const int status = std::system(full.c_str());
     EXPECT_EQ(WEXITSTATUS(status), 1);
     EXPECT_THAT(contentOf(folder.path("error")),
-                HasSubstr("vexatouch replay: cannot write the results: "));
+                HasSubstr("vexatouch replay: cannot write the results: No space left on device\n"));
 }
 
 #endif
