@@ -50,7 +50,11 @@ LiveScreen::LiveScreen(Streams& streams) : streams_(streams), saved_(std::make_u
     remember.sa_handler = rememberSignal;  // without SA_RESTART: it interrupts the waiting
     sigemptyset(&remember.sa_mask);
     for (std::size_t i = 0; i < kSignals.size(); ++i) {
-        sigaction(kSignals[i], &remember, &saved_->actions[i]);
+        sigaction(kSignals[i], nullptr, &saved_->actions[i]);
+        // What the process was started to ignore stays ignored.
+        if (saved_->actions[i].sa_handler != SIG_IGN) {
+            sigaction(kSignals[i], &remember, nullptr);
+        }
     }
     // Keys only when they are ours to read: the process's own standard input, a terminal.
     if (&streams.in == &std::cin && tcgetattr(STDIN_FILENO, &saved_->keyboard) == 0) {

@@ -19,17 +19,24 @@
 namespace VexaTouch::Tools {
 namespace {
 
-/// SIGHUP only unless the process was started to ignore it (nohup).
+bool isIgnored(int signal) {
+    struct sigaction action{};
+    sigaction(signal, nullptr, &action);
+    return action.sa_handler == SIG_IGN;
+}
+
+/// SIGHUP and SIGINT only unless the process was started to ignore them: by nohup, and by a shell
+/// without job control that put it into the background.
 sigset_t watchedSignals() {
     sigset_t set{};
     sigemptyset(&set);
-    for (const int signal : {SIGINT, SIGTERM, SIGUSR1}) {
+    for (const int signal : {SIGTERM, SIGUSR1}) {
         sigaddset(&set, signal);
     }
-    struct sigaction hangUp{};
-    sigaction(SIGHUP, nullptr, &hangUp);
-    if (hangUp.sa_handler != SIG_IGN) {
-        sigaddset(&set, SIGHUP);
+    for (const int signal : {SIGINT, SIGHUP}) {
+        if (!isIgnored(signal)) {
+            sigaddset(&set, signal);
+        }
     }
     return set;
 }

@@ -11,7 +11,8 @@ namespace VexaTouch::Tools {
 
 /// Takes the signals that a long run is steered by, as long as it lives: SIGINT, SIGTERM and SIGHUP
 /// ask for an end, SIGUSR1 for the recording; SIGPIPE and SIGXFSZ only make the writing fail. The
-/// second signal that asks for an end ends the process at once.
+/// second signal that asks for an end ends the process at once. SIGINT and SIGHUP stay ignored in a
+/// process that was started so.
 ///
 /// Signals are read by a thread of its own, so that the second one also works while everybody else
 /// is stuck; no handler interrupts anybody. Made before any thread that shall not be bothered by

@@ -23,7 +23,9 @@ namespace VexaTouch::Testing {
 /// The program as a process of its own, its two outputs in pipes.
 class ProgramRun {
 public:
-    explicit ProgramRun(const std::vector<std::string>& arguments) {
+    /// `interrupt` is what it was started to do at SIGINT, SIG_DFL or SIG_IGN.
+    explicit ProgramRun(const std::vector<std::string>& arguments,
+                        sighandler_t interrupt = SIG_DFL) {
         int out[2];
         int error[2];
         if (pipe2(out, O_CLOEXEC) != 0 || pipe2(error, O_CLOEXEC) != 0) {
@@ -40,7 +42,7 @@ public:
             dup2(out[1], STDOUT_FILENO);
             dup2(error[1], STDERR_FILENO);
             // A test run in the background was started with interrupts ignored.
-            std::signal(SIGINT, SIG_DFL);
+            std::signal(SIGINT, interrupt);
             execv(vexatouchProgram(), pointers.data());
             _exit(127);
         }

@@ -429,6 +429,18 @@ TEST_F(RunCommandTest, SignalsEndItInOrder) {
     }
 }
 
+TEST_F(RunCommandTest, InterruptThatWasIgnoredBeforeStaysIgnored) {
+    ProgramRun program(endlessRun(folder), SIG_IGN);
+    ASSERT_TRUE(program.readOutUntil("\"tap\"")) << program.error();
+    program.signal(SIGINT);
+    for (int taps = 0; taps < 3; ++taps) {
+        EXPECT_TRUE(program.readOutUntil("\"tap\"")) << program.error();
+    }
+    // The first that asks for an end.
+    program.signal(SIGTERM);
+    EXPECT_TRUE(endedInOrder(program.end())) << program.error();
+}
+
 TEST_F(RunCommandTest, SecondSignalEndsItAtOnceEvenWhenStuck) {
     ProgramRun program({"run", "--json", "--device", asFastAsTaken("mixed")});
     program.waitUntilStuck();
