@@ -88,6 +88,7 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     for (bool any = takeFrames(); !isOver(); any = takeFrames()) {
         drawProgress(false);
         lookAfterReports();
+        answerUserSignal();
         // A feed that was not empty wakes nobody.
         if (!any) {
             waitForWork();
@@ -142,6 +143,16 @@ void RecordRun::lookAfterReports() {
         nextLook_ = now + watch_.interval();
         stuck_ = watch_.look();
     }
+}
+
+void RecordRun::answerUserSignal() {
+    if (!signals_.takeRecordingWanted()) {
+        return;
+    }
+    streams_.error << (streams_.errorIsTerminal ? kEraseLine : "")
+                   << "vexatouch record: " << stream_->frames() << " frames are in "
+                   << stream_->name() << "; what is written there is whole without SIGUSR1"
+                   << std::endl;
 }
 
 bool RecordRun::takeFrames() {

@@ -163,6 +163,19 @@ TEST_F(RecordCommandTest, SignalsEndItInOrder) {
     }
 }
 
+TEST_F(RecordCommandTest, UserSignalSaysHowMuchIsThereAndTheRecordingGoesOn) {
+    const std::string path = folder.path("session.json");
+    ProgramRun program(endless(path));
+    waitForBytes(path, 50'000);
+    program.signal(SIGUSR1);
+    ASSERT_TRUE(program.readErrorUntil("\n")) << program.error();
+    EXPECT_THAT(program.error(),
+                MatchesRegex("vexatouch record: [0-9]+ frames are in .*/session.json; what is "
+                             "written there is whole without SIGUSR1\n"));
+    program.signal(SIGTERM);
+    EXPECT_TRUE(endedInOrder(program.end())) << program.error();
+}
+
 // Whatever it was doing, a killed program leaves a file that is read as it is, or one of which
 // every frame that was written is restored.
 TEST_F(RecordCommandTest, KilledProgramLeavesEveryFrameThatWasWritten) {
