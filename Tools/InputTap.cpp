@@ -96,40 +96,18 @@ void InputTap::reportHandled() noexcept {
 
 TappedDevice::TappedDevice(std::shared_ptr<Vexa::DeviceBackend> device,
                            std::shared_ptr<InputTap> tap) noexcept
-    : device_(std::move(device)), tap_(std::move(tap)) {}
-
-vexa_status TappedDevice::open(std::uint32_t options, int& descriptor) noexcept {
-    return device_->open(options, descriptor);
-}
-
-void TappedDevice::close(std::uint32_t options) noexcept {
-    device_->close(options);
-}
-
-vexa_status TappedDevice::getReport(vexa_report_type type, std::uint32_t reportId,
-                                    std::span<std::uint8_t> report, std::size_t& length) noexcept {
-    return device_->getReport(type, reportId, report, length);
-}
-
-Vexa::PropertyValue TappedDevice::property(const Vexa::PropertyValue& key) noexcept {
-    return device_->property(key);
-}
-
-bool TappedDevice::setProperty(const Vexa::PropertyValue& key,
-                               const Vexa::PropertyValue& value) noexcept {
-    return device_->setProperty(key, value);
-}
+    : ForwardingDevice(std::move(device)), tap_(std::move(tap)) {}
 
 void TappedDevice::reportArrived(std::span<const std::uint8_t> report,
                                  std::uint64_t timestamp) noexcept {
     tap_->reportArrived(report);
-    device_->reportArrived(report, timestamp);
+    ForwardingDevice::reportArrived(report, timestamp);
 }
 
 // The tap first, here too: whoever is told by the device may write a setting next.
 void TappedDevice::reportHandled() noexcept {
     tap_->reportHandled();
-    device_->reportHandled();
+    ForwardingDevice::reportHandled();
 }
 
 }  // namespace VexaTouch::Tools

@@ -6,6 +6,7 @@
 #include "Platform/Mutex.h"
 #include "Platform/PropertyValue.h"
 #include "Platform/ThreadAnnotations.h"
+#include "Tools/ForwardingDevice.h"
 #include "Tools/FrameFeed.h"
 
 #include <cstdint>
@@ -65,25 +66,17 @@ private:
 };
 
 /// A device whose reports a tap sees; all else is the device's.
-class TappedDevice final : public Vexa::DeviceBackend {
+class TappedDevice final : public ForwardingDevice {
 public:
     TappedDevice(std::shared_ptr<Vexa::DeviceBackend> device,
                  std::shared_ptr<InputTap> tap) noexcept;
 
-    vexa_status open(std::uint32_t options, int& descriptor) noexcept override;
-    void close(std::uint32_t options) noexcept override;
-    vexa_status getReport(vexa_report_type type, std::uint32_t reportId,
-                          std::span<std::uint8_t> report, std::size_t& length) noexcept override;
-    Vexa::PropertyValue property(const Vexa::PropertyValue& key) noexcept override;
-    bool setProperty(const Vexa::PropertyValue& key,
-                     const Vexa::PropertyValue& value) noexcept override;
     // The library calls both in turn, on one thread: what the first takes the second gives back.
     void reportArrived(std::span<const std::uint8_t> report,
                        std::uint64_t timestamp) noexcept override NO_THREAD_SAFETY_ANALYSIS;
     void reportHandled() noexcept override NO_THREAD_SAFETY_ANALYSIS;
 
 private:
-    const std::shared_ptr<Vexa::DeviceBackend> device_;
     const std::shared_ptr<InputTap> tap_;
 };
 

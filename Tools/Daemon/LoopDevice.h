@@ -1,15 +1,13 @@
 #pragma once
 
-#include "Platform/DeviceBackend.h"
 #include "Platform/Mutex.h"
 #include "Platform/RunLoop.h"
 #include "Platform/ThreadAnnotations.h"
+#include "Tools/ForwardingDevice.h"
+#include "Tools/FrameGaps.h"
 
 #include <atomic>
-#include <cstddef>
 #include <cstdint>
-#include <memory>
-#include <optional>
 #include <span>
 #include <string>
 #include <utility>
@@ -28,18 +26,10 @@ struct ReportCounts {
 
 /// A device that counts its reports and knows the loop that serves them, so that a task can be run
 /// between them; all else is the device's.
-class LoopDevice final : public Vexa::DeviceBackend {
+class LoopDevice final : public ForwardingDevice {
 public:
-    explicit LoopDevice(std::shared_ptr<Vexa::DeviceBackend> device) noexcept
-        : device_(std::move(device)) {}
+    using ForwardingDevice::ForwardingDevice;
 
-    vexa_status open(std::uint32_t options, int& descriptor) noexcept override;
-    void close(std::uint32_t options) noexcept override;
-    vexa_status getReport(vexa_report_type type, std::uint32_t reportId,
-                          std::span<std::uint8_t> report, std::size_t& length) noexcept override;
-    Vexa::PropertyValue property(const Vexa::PropertyValue& key) noexcept override;
-    bool setProperty(const Vexa::PropertyValue& key,
-                     const Vexa::PropertyValue& value) noexcept override;
     void reportArrived(std::span<const std::uint8_t> report,
                        std::uint64_t timestamp) noexcept override;
     void reportHandled() noexcept override;
@@ -63,18 +53,13 @@ public:
     [[nodiscard]] ReportCounts counts() const noexcept;
 
 private:
-    void countGap(std::uint32_t frame) noexcept;
-
-    const std::shared_ptr<Vexa::DeviceBackend> device_;
     Vexa::Mutex lock_;
     Vexa::RunLoop loop_ GUARDED_BY(lock_);
     std::string mode_ GUARDED_BY(lock_);
-    std::optional<std::uint32_t> lastFrame_;  // the input thread's
+    FrameGaps gaps_;
     std::atomic<std::uint64_t> reports_{0};
     std::atomic<std::uint64_t> images_{0};
     std::atomic<std::uint64_t> firmwareEvents_{0};
-    std::atomic<std::uint64_t> gaps_{0};
-    std::atomic<std::uint64_t> framesLost_{0};
 };
 
 }  // namespace VexaTouch::Tools::Daemon
