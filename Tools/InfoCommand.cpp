@@ -31,9 +31,9 @@ constexpr std::array<ExampleEntry, 2> kExamples = {{
 constexpr std::string_view kDescription =
     R"(Replays a recording as fast as it goes and says what it holds: its frames by type, how long it is, how regularly the images came, the settings written, and the counters of events at the end.
 
-Intervals are taken from the device's clock, by nearest rank, without the steps backward. A clock jump is such a step or one of more than a second. An image is disjoint when its number is not one more than that of the image before.
+Intervals are taken from the device's clock, by nearest rank, without the steps backward. A clock jump is such a step or one of more than a second. An image is disjoint when its number is not one more than that of the image before. Inputs that were lost while it was recorded, because the file was not written quickly enough, are counted, and a warning says so.
 
-With --json the object has the members version, frames (input_reports, states, images, firmware_events, invalid), duration_ns, image_interval_ms (median, p99, max; null with fewer than two images), disjoint_images, clock_jumps, settings (the last value by key), stats.)";
+With --json the object has the members version, frames (input_reports, states, images, firmware_events, invalid), duration_ns, image_interval_ms (median, p99, max; null with fewer than two images), disjoint_images, clock_jumps, lost_reports, lost_settings, settings (the last value by key), stats.)";
 
 void printJson(const RecordingFile& file, const Replay& replay, const RecordingSummary& summary,
                Streams& streams) {
@@ -73,6 +73,8 @@ void printJson(const RecordingFile& file, const Replay& replay, const RecordingS
     json.endObject();
     number("disjoint_images", summary.disjointImages());
     number("clock_jumps", summary.clockJumps());
+    number("lost_reports", summary.lost().reports);
+    number("lost_settings", summary.lost().settings);
     json.key("settings");
     json.value(summary.settings());
     json.key("stats");
@@ -133,6 +135,12 @@ std::string countersText(const Algs& algs, bool dispatched) {
     return text.empty() ? "nothing" : text;
 }
 
+std::string lostText(const RecordingSummary& summary) {
+    return counted(summary.lost().reports, "report") + " and " +
+           counted(summary.lost().settings, "setting") + ", at " +
+           counted(summary.lossPlaces(), "place");
+}
+
 void printText(const RecordingFile& file, const Replay& replay, const RecordingSummary& summary,
                Streams& streams) {
     streams.out << file.name << '\n';
@@ -143,6 +151,9 @@ void printText(const RecordingFile& file, const Replay& replay, const RecordingS
     line(streams, "interval", intervalText(summary));
     line(streams, "disjoint", counted(summary.disjointImages(), "image"));
     line(streams, "clock jumps", std::to_string(summary.clockJumps()));
+    if (summary.lossPlaces() > 0) {
+        line(streams, "lost", lostText(summary));
+    }
     line(streams, "mid-touch",
          summary.beginsInMidTouch() ? "begins with a finger on the surface" : "no");
     bool first = true;
@@ -173,6 +184,11 @@ int runInfo(const Arguments& arguments, Streams& streams) {
         printJson(file, replay, summary, streams);
     } else {
         printText(file, replay, summary, streams);
+    }
+    if (summary.lossPlaces() > 0) {
+        streams.error << "vexatouch info: warning: " << file.name << ": " << lostText(summary)
+                      << ", were lost while it was recorded; what follows a loss may give other "
+                         "events than the service gave\n";
     }
     return kExitSuccess;
 }

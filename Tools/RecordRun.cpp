@@ -3,8 +3,6 @@
 #include "Tools/Failure.h"
 
 #include <algorithm>
-#include <array>
-#include <cstdio>
 #include <span>
 #include <string>
 #include <string_view>
@@ -14,17 +12,6 @@ namespace VexaTouch::Tools {
 namespace {
 
 constexpr std::string_view kPipelineDomain = "Pipeline.";
-constexpr std::string_view kEraseLine = "\r\x1b[K";
-constexpr auto kDrawInterval = std::chrono::milliseconds(100);
-
-RecordedFrame gapFrame(const char* key, std::uint64_t count, std::uint64_t timestampNs) {
-    RecordedFrame frame;
-    frame.type = RecordedFrame::Type::State;
-    frame.timestamp = timestampNs;
-    frame.key = key;
-    frame.value = count;
-    return frame;
-}
 
 }  // namespace
 
@@ -39,8 +26,8 @@ RecordRun::RecordRun(const Host::PluginLibrary& library,
       streams_(streams),
       tap_(std::make_shared<InputTap>()),
       feed_(std::make_shared<FrameFeed>([&wake] { wake.notify(); }, options_.feedBytes)),
-      decoder_({.onFrame = [this](const RecordedFrame& frame) { take(frame); },
-                .onGap = [this](const FrameGap& gap) { take(gap); }}),
+      decoder_({.onFrame = [this](const RecordedFrame& frame) { keeper_->take(frame); },
+                .onGap = [this](const FrameGap& gap) { keeper_->take(gap); }}),
       watch_(*device, streams.patience),
       noHoldBack_(!options_.holdBack),
       registration_(std::make_shared<TappedDevice>(device, tap_)),
@@ -78,15 +65,16 @@ void RecordRun::installHooks() {
 
 RecordSummary RecordRun::run(RecordingStream& stream) {
     stream_ = &stream;
+    keeper_.emplace(stream, options_.count, streams_);
     tap_->add(feed_, session_);
-    start_ = std::chrono::steady_clock::now();
+    const Time start = std::chrono::steady_clock::now();
     session_.begin();
     if (options_.duration) {
-        deadline_ = start_ + *options_.duration;
+        deadline_ = start + *options_.duration;
     }
-    nextLook_ = start_ + watch_.interval();
+    nextLook_ = start + watch_.interval();
     for (bool any = takeFrames(); !isOver(); any = takeFrames()) {
-        drawProgress(false);
+        keeper_->drawProgress();
         lookAfterReports();
         answerUserSignal();
         // A feed that was not empty wakes nobody.
@@ -99,7 +87,7 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     tap_->remove(feed_);
     while (takeFrames()) {
     }
-    drawProgress(true);
+    keeper_->eraseProgress();
     stream.finish();
     session_.end();
     if (unplugged_) {
@@ -108,12 +96,12 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     if (stuck_) {
         throw Failure(ReportWatch::kFault);
     }
-    return summary_;
+    return keeper_->summary();
 }
 
 bool RecordRun::isOver() {
-    return finished_ || stuck_ || signals_.endWanted() || (unplugged_ && lastReports_.areTaken()) ||
-           (options_.count && summary_.reports >= *options_.count) ||
+    return finished_ || stuck_ || signals_.endWanted() || keeper_->isFull() ||
+           (unplugged_ && lastReports_.areTaken()) ||
            (deadline_ && std::chrono::steady_clock::now() >= *deadline_);
 }
 
@@ -123,8 +111,8 @@ void RecordRun::waitForWork() {
     if (deadline_) {
         noLaterThan(*deadline_);
     }
-    if (streams_.errorIsTerminal) {
-        noLaterThan(nextDraw_);
+    if (const auto due = keeper_->progressDue()) {
+        noLaterThan(*due);
     }
     if (const auto due = stream_->syncDue()) {
         noLaterThan(*due);
@@ -149,8 +137,8 @@ void RecordRun::answerUserSignal() {
     if (!signals_.takeRecordingWanted()) {
         return;
     }
-    streams_.error << (streams_.errorIsTerminal ? kEraseLine : "")
-                   << "vexatouch record: " << stream_->frames() << " frames are in "
+    keeper_->eraseProgress();
+    streams_.error << "vexatouch record: " << stream_->frames() << " frames are in "
                    << stream_->name() << "; what is written there is whole without SIGUSR1"
                    << std::endl;
 }
@@ -164,7 +152,7 @@ bool RecordRun::takeFrames() {
     try {
         stream_->flush();
     } catch (const Failure&) {
-        drawProgress(true);
+        keeper_->eraseProgress();
         throw;
     }
     return any;
@@ -185,49 +173,6 @@ void RecordRun::endHoldBack() noexcept {
     noHoldBack_.store(true);
     turns_.fetch_add(1);
     turns_.notify_all();
-}
-
-void RecordRun::take(const RecordedFrame& frame) {
-    if (options_.count && summary_.reports >= *options_.count) {
-        return;
-    }
-    latestNs_ = frame.timestamp;
-    ++(frame.type == RecordedFrame::Type::InputReport ? summary_.reports : summary_.settings);
-    stream_->add(frame);
-}
-
-// The file itself says what it lacks; a pipeline passes over keys that it does not know.
-void RecordRun::take(const FrameGap& gap) {
-    if (options_.count && summary_.reports >= *options_.count) {
-        return;
-    }
-    summary_.lost.reports += gap.reports;
-    summary_.lost.settings += gap.settings;
-    if (gap.reports > 0) {
-        stream_->add(gapFrame("Recording.LostReports", gap.reports, latestNs_));
-    }
-    if (gap.settings > 0) {
-        stream_->add(gapFrame("Recording.LostSettings", gap.settings, latestNs_));
-    }
-}
-
-void RecordRun::drawProgress(bool last) {
-    if (!streams_.errorIsTerminal) {
-        return;
-    }
-    const Time now = std::chrono::steady_clock::now();
-    if (last) {
-        streams_.error << kEraseLine << std::flush;
-    } else if (now >= nextDraw_) {
-        nextDraw_ = now + kDrawInterval;
-        constexpr double kBytesPerMegabyte = 1e6;
-        std::array<char, 96> line{};
-        std::snprintf(line.data(), line.size(), "%llu frames, %.1f MB, %.1f s",
-                      static_cast<unsigned long long>(stream_->frames()),
-                      static_cast<double>(stream_->bytes()) / kBytesPerMegabyte,
-                      std::chrono::duration<double>(now - start_).count());
-        streams_.error << kEraseLine << line.data() << std::flush;
-    }
 }
 
 }  // namespace VexaTouch::Tools

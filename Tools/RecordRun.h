@@ -7,6 +7,7 @@
 #include "Tools/InputTap.h"
 #include "Tools/LastReports.h"
 #include "Tools/ObservedDevice.h"
+#include "Tools/RecordKeeper.h"
 #include "Tools/RecordingStream.h"
 #include "Tools/ReportWatch.h"
 #include "Tools/SettingKeys.h"
@@ -36,13 +37,6 @@ struct RecordRunOptions {
     bool holdBack = true;
 };
 
-/// What a recording holds when it ends.
-struct RecordSummary {
-    std::uint64_t reports = 0;
-    std::uint64_t settings = 0;
-    FrameGap lost;  ///< because the file was not written quickly enough
-};
-
 /// A service with a device of its own whose every input goes into a file, for as long as that
 /// takes. It ends when the device has played everything or is gone and what it had sent is taken,
 /// after a time, after a number of reports, at a signal, when the file cannot be written any more,
@@ -68,7 +62,9 @@ public:
     /// far as it can be.
     RecordSummary run(RecordingStream& stream);
     /// What went into the stream, also when run() threw.
-    [[nodiscard]] const RecordSummary& summary() const noexcept { return summary_; }
+    [[nodiscard]] RecordSummary summary() const noexcept {
+        return keeper_ ? keeper_->summary() : RecordSummary{};
+    }
 
 private:
     using Time = std::chrono::steady_clock::time_point;
@@ -81,9 +77,6 @@ private:
     bool takeFrames();
     void holdBack() noexcept;
     void endHoldBack() noexcept;
-    void take(const RecordedFrame& frame);
-    void take(const FrameGap& gap);
-    void drawProgress(bool last);
 
     std::shared_ptr<ObservedDevice> device_;
     RecordRunOptions options_;
@@ -93,12 +86,9 @@ private:
     std::shared_ptr<InputTap> tap_;
     std::shared_ptr<FrameFeed> feed_;
     FrameDecoder decoder_;
-    RecordingStream* stream_ = nullptr;  // while it runs
-    RecordSummary summary_;
-    std::uint64_t latestNs_ = 0;
+    RecordingStream* stream_ = nullptr;   // while it runs
+    std::optional<RecordKeeper> keeper_;  // from then on
     std::optional<Time> deadline_;
-    Time start_;
-    Time nextDraw_;
     ReportWatch watch_;
     Time nextLook_;
     bool stuck_ = false;

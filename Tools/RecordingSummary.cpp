@@ -1,5 +1,7 @@
 #include "Tools/RecordingSummary.h"
 
+#include "Tools/RecordKeeper.h"
+
 #include <algorithm>
 
 namespace VexaTouch::Tools {
@@ -22,9 +24,21 @@ void RecordingSummary::add(const PlayedFrame& played, const Algs& algs) {
     earliestNs_ = std::min(earliestNs_.value_or(timeNs), timeNs);
     latestNs_ = std::max(latestNs_, timeNs);
     if (played.type == PlayedType::State) {
-        settings_[played.frame->key] = played.frame->value;
+        addState(*played.frame);
     } else if (played.type == PlayedType::Image) {
         addImage(played, algs);
+    }
+}
+
+void RecordingSummary::addState(const RecordedFrame& frame) {
+    if (frame.key == kLostReportsKey) {
+        lost_.reports += frame.value.toUnsigned64();
+        ++lossPlaces_;
+    } else if (frame.key == kLostSettingsKey) {
+        lost_.settings += frame.value.toUnsigned64();
+        ++lossPlaces_;
+    } else {
+        settings_[frame.key] = frame.value;
     }
 }
 

@@ -1,6 +1,8 @@
 #pragma once
 
+#include "Pipeline/RecordedFrame.h"
 #include "Platform/PropertyValue.h"
+#include "Tools/FrameFeed.h"
 #include "Tools/Replay.h"
 
 #include <cstdint>
@@ -32,6 +34,10 @@ public:
     [[nodiscard]] std::uint64_t disjointImages() const noexcept { return disjointImages_; }
     /// Steps of the device's clock from image to image that go backward or beyond one second.
     [[nodiscard]] std::uint64_t clockJumps() const noexcept { return clockJumps_; }
+    /// What was not recorded because the file was not written quickly enough, and at how many
+    /// places it is missing.
+    [[nodiscard]] const FrameGap& lost() const noexcept { return lost_; }
+    [[nodiscard]] std::uint64_t lossPlaces() const noexcept { return lossPlaces_; }
     /// The last value of each key that the recording sets.
     [[nodiscard]] const Vexa::PropertyValue::Dictionary& settings() const noexcept {
         return settings_;
@@ -40,6 +46,7 @@ public:
     [[nodiscard]] bool beginsInMidTouch() const noexcept { return beginsInMidTouch_; }
 
 private:
+    void addState(const RecordedFrame& frame);
     void addImage(const PlayedFrame& played, const Algs& algs);
 
     std::optional<std::uint64_t> earliestNs_;
@@ -50,6 +57,8 @@ private:
     std::uint64_t maxBeforeFrame_ = 0;
     std::uint64_t disjointImages_ = 0;
     std::uint64_t clockJumps_ = 0;
+    FrameGap lost_;
+    std::uint64_t lossPlaces_ = 0;
     Vexa::PropertyValue::Dictionary settings_;
     bool beginsInMidTouch_ = false;
 };

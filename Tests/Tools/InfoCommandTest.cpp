@@ -60,6 +60,8 @@ std::string jsonOfImages(std::size_t count, std::uint64_t durationNs, const std:
            std::to_string(disjoint) + R"(,
   "clock_jumps": )" +
            std::to_string(jumps) + R"(,
+  "lost_reports": 0,
+  "lost_settings": 0,
   "settings": {},
   "stats": {
     "Dispatched": {
@@ -149,6 +151,8 @@ TEST(InfoCommand, JsonHasTheLastSettingsAndTheCounters) {
   },
   "disjoint_images": 0,
   "clock_jumps": 0,
+  "lost_reports": 0,
+  "lost_settings": 0,
   "settings": {
     "Algs.HoldTimeoutMilliseconds": 250.5,
     "other": "text"
