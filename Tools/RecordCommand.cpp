@@ -140,7 +140,7 @@ int recordFromDaemon(const Arguments& arguments, Streams& streams) {
     const FileDescriptor frames = client.recordStream(client.choose(arguments));
     RecordingStream stream(openAppendTarget(file, arguments.given("--force"), streams),
                            file == "-" ? "standard output" : file, syncEvery);
-    const RecordSummary summary = Daemon::recordStreamed(frames, options, stream);
+    const RecordSummary summary = Daemon::recordStreamed(frames, options, stream, streams);
     return printSummary(stream, summary, streams);
 }
 

@@ -44,10 +44,14 @@ bool WakeUp::wait(std::optional<Time> until, int hangUp) const noexcept {
         return false;
     }
     if (waiting[0].revents != 0) {
-        std::uint64_t count = 0;
-        static_cast<void>(::read(event_.get(), &count, sizeof count) == sizeof count);
+        clear();
     }
     return (waiting[1].revents & (POLLHUP | POLLERR)) != 0;
+}
+
+void WakeUp::clear() const noexcept {
+    std::uint64_t count = 0;
+    static_cast<void>(::read(event_.get(), &count, sizeof count) == sizeof count);
 }
 
 }  // namespace VexaTouch::Tools

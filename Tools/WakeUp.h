@@ -22,6 +22,10 @@ public:
     // NOLINTNEXTLINE(modernize-use-nodiscard): who gives no descriptor need not look
     bool wait(std::optional<Time> until, int hangUp = -1) const noexcept;
 
+    /// For those who wait for several things at once: readable when notified, until cleared.
+    [[nodiscard]] int descriptor() const noexcept { return event_.get(); }
+    void clear() const noexcept;
+
 private:
     FileDescriptor event_;
 };

@@ -5,6 +5,7 @@
 #include <systemd/sd-bus.h>
 
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <exception>
 #include <utility>
@@ -38,22 +39,46 @@ void check(int result, const char* what) {
     }
 }
 
-void openBus(sd_bus** bus, const std::string& where) {
+std::string variable(const char* name, const std::string& otherwise) {
+    const char* value = std::getenv(name);
+    return value == nullptr || *value == '\0' ? otherwise : value;
+}
+
+/// Where libsystemd looks.
+std::string addressOf(const std::string& where) {
     if (where == "system") {
-        const int result = sd_bus_open_system(bus);
-        check(result, "the system bus does not answer");
-        return;
+        return variable("DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/run/dbus/system_bus_socket");
     }
     if (where == "session") {
-        check(sd_bus_open_user(bus), "the session's bus does not answer");
-        return;
+        const std::string folder = variable("XDG_RUNTIME_DIR", "");
+        return variable("DBUS_SESSION_BUS_ADDRESS",
+                        folder.empty() ? "no address: neither DBUS_SESSION_BUS_ADDRESS nor "
+                                         "XDG_RUNTIME_DIR is set"
+                                       : "unix:path=" + folder + "/bus");
     }
-    check(sd_bus_new(bus), "no memory for a connection");
-    const std::string what = "the bus " + where + " does not answer";
-    check(sd_bus_set_address(*bus, where.c_str()), what.c_str());
-    check(sd_bus_set_bus_client(*bus, 1), what.c_str());
-    check(sd_bus_negotiate_fds(*bus, 1), what.c_str());
-    check(sd_bus_start(*bus), what.c_str());
+    return where;
+}
+
+/// For messages.
+std::string nameOf(const std::string& where) {
+    const std::string address = addressOf(where);
+    return address == where     ? "the bus " + where
+           : where == "session" ? "the session's bus (" + address + ')'
+                                : "the " + where + " bus (" + address + ')';
+}
+
+int openBus(sd_bus** bus, const std::string& where) {
+    if (where == "system") {
+        return sd_bus_open_system(bus);
+    }
+    if (where == "session") {
+        return sd_bus_open_user(bus);
+    }
+    int result = sd_bus_new(bus);
+    result = result < 0 ? result : sd_bus_set_address(*bus, where.c_str());
+    result = result < 0 ? result : sd_bus_set_bus_client(*bus, 1);
+    result = result < 0 ? result : sd_bus_negotiate_fds(*bus, 1);
+    return result < 0 ? result : sd_bus_start(*bus);
 }
 
 }  // namespace
@@ -68,15 +93,15 @@ void Bus::Release::operator()(sd_bus* bus) const noexcept {
 
 Bus::Bus(const std::string& where) {
     sd_bus* bus = nullptr;
-    try {
-        openBus(&bus, where);
+    int result = openBus(&bus, where);
+    if (result >= 0) {
         // The greeting is over when the bus has told our name.
         const char* name = nullptr;
-        check(sd_bus_get_unique_name(bus, &name),
-              ("the bus " + where + " does not answer").c_str());
-    } catch (...) {
+        result = sd_bus_get_unique_name(bus, &name);
+    }
+    if (result < 0) {
         sd_bus_close_unref(bus);
-        throw;
+        throw Failure(nameOf(where) + " does not answer: " + std::strerror(-result));
     }
     bus_.reset(bus);
 }
@@ -181,7 +206,7 @@ void Bus::reply(const BusMessage& call, const std::function<void(BusMessage& rep
         static_cast<void>(sd_bus_send(nullptr, made, nullptr));
     } catch (const BusError& wrong) {
         fail(call, wrong);
-    } catch (const Failure& wrong) {
+    } catch (const std::exception& wrong) {
         fail(call, BusError(ErrorName::kFailed, wrong.what()));
     }
 }
@@ -198,6 +223,20 @@ void Bus::answer(const BusMessage& call, const std::optional<BusError>& error,
     } else {
         reply(call, write);
     }
+}
+
+void Bus::demandRoom(std::size_t bytes) {
+    constexpr std::size_t kLarge = 4096;
+    if (bytes < kLarge) {
+        return;
+    }
+    std::uint64_t queued = 0;
+    static_cast<void>(sd_bus_get_n_queued_write(get(), &queued));
+    queuedBytes_ = queued == 0 ? 0 : queuedBytes_;
+    if (queuedBytes_ > 0 && queuedBytes_ + bytes > kMostQueuedBytes) {
+        throw BusError(ErrorName::kBusy, "too many large answers wait for the bus; try again");
+    }
+    queuedBytes_ += bytes;
 }
 
 BusMessage Bus::signal(const std::string& path, const char* interface, const char* member) const {

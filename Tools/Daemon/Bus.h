@@ -4,6 +4,7 @@
 #include "Tools/Daemon/BusMessage.h"
 #include "Tools/Daemon/EventLoop.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -34,6 +35,8 @@ class Bus {
 public:
     /// Signals that wait here while the bus takes no more; what comes beyond is dropped.
     static constexpr std::uint64_t kMostQueued = 256;
+    /// Bytes of large answers that wait here meanwhile.
+    static constexpr std::size_t kMostQueuedBytes = std::size_t{8} << 20U;
 
     /// "system", "session" or the address of a bus ("unix:path=/run/..."). Throws Failure.
     explicit Bus(const std::string& where);
@@ -73,6 +76,10 @@ public:
     static void answer(const BusMessage& call, const std::optional<BusError>& error,
                        const std::function<void(BusMessage& reply)>& write);
 
+    /// Before an answer that may be large is written. Throws BusError (Busy) while the bus does not
+    /// take what waits already; one answer has room always.
+    void demandRoom(std::size_t bytes);
+
     [[nodiscard]] BusMessage signal(const std::string& path, const char* interface,
                                     const char* member) const;
     /// False when the message was dropped because too many wait.
@@ -103,6 +110,7 @@ private:
     BusSlot filter_;
     BusSlot lost_;
     bool attached_ = false;
+    std::size_t queuedBytes_ = 0;  // of large answers since nothing waited
 };
 
 }  // namespace VexaTouch::Tools::Daemon

@@ -155,6 +155,7 @@ public:
         }
         switch (type) {
             case 'v':
+                count(std::strlen(contents));
                 return inside(type, contents, [&] { return any(level); });
             case 'b':
                 return read<int>(type) != 0;
@@ -177,11 +178,15 @@ public:
             case 's':
             case 'o':
                 return PropertyValue(text(type));
+            // A value that is next to nothing in the message is one in memory all the same.
             case 'g':
+                count(sizeof(std::uint64_t));
                 return empty(type) ? PropertyValue::null() : refused("g");
             case 'a':
+                count(sizeof(std::uint64_t));
                 return array(contents, level);
             case 'r':
+                count(sizeof(std::uint64_t));
                 return structure(contents);
             default:
                 return refused(std::string(1, type));

@@ -24,7 +24,7 @@ struct sd_bus_message;
 /// a signed one, o as a string, an array of any type and a dictionary with string keys of any type.
 namespace VexaTouch::Tools::Daemon::BusValue {
 
-/// Of what strangers send: bytes of texts, keys, bytes and numbers together.
+/// Of what strangers send: bytes of texts, keys and bytes together, and eight for every value.
 inline constexpr std::size_t kMostBytes = 16'384;
 inline constexpr std::size_t kNoLimit = SIZE_MAX;
 /// Arrays and dictionaries in each other. The bus ends the connection of who sends more than 64

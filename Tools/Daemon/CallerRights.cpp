@@ -9,6 +9,7 @@
 #include <array>
 #include <cerrno>
 #include <cstddef>
+#include <exception>
 #include <utility>
 
 namespace VexaTouch::Tools::Daemon {
@@ -100,6 +101,9 @@ void CallerRights::decide(const Asked& asked, Right right) const {
         asked.granted();
     } catch (const BusError& error) {
         Bus::fail(asked.call, error);
+    } catch (const std::exception& error) {
+        // No memory or descriptor is left, which is the caller's affair and not the daemon's end.
+        Bus::fail(asked.call, BusError(ErrorName::kFailed, error.what()));
     }
 }
 

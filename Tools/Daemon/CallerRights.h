@@ -49,7 +49,7 @@ public:
     CallerRights(Bus& bus, RightsPolicy policy) : bus_(bus), policy_(std::move(policy)) {}
 
     /// Calls `granted` now or later if the caller has the right; otherwise the call is answered
-    /// with AccessDenied, or Busy. What `granted` throws as BusError is the answer as well.
+    /// with AccessDenied, or Busy. What `granted` throws is the answer as well.
     void demand(const BusMessage& call, Right right, std::function<void()> granted);
 
 private:

@@ -126,6 +126,7 @@ void Daemon::takeDown(Device& device) {
 void Daemon::taken(Device& device) {
     const ReportCounts counts = device.instance->counts();
     reportsOfGone_ += counts.reports;
+    framesLostOfGone_ += counts.framesLost;
     if (counts.gaps > 0) {
         log_ << device.title() << ": " << counts.framesLost << " of "
              << counts.images + counts.framesLost << " frames were lost at " << counts.gaps
@@ -202,6 +203,14 @@ std::uint64_t Daemon::reports() const noexcept {
         reports += device->instance->counts().reports;
     }
     return reports;
+}
+
+std::uint64_t Daemon::framesLost() const noexcept {
+    std::uint64_t lost = framesLostOfGone_;
+    for (const auto& device : devices_) {
+        lost += device->instance->counts().framesLost;
+    }
+    return lost;
 }
 
 std::vector<std::string> Daemon::paths() const {

@@ -68,9 +68,11 @@ public:
     /// Calls back once each input thread has answered.
     void ping(std::function<void()> answered);
 
-    /// Surfaces that are plugged in, and reports that all of them have sent so far.
+    /// Surfaces that are plugged in.
     [[nodiscard]] std::size_t surfaces() const noexcept;
+    /// Of all surfaces so far.
     [[nodiscard]] std::uint64_t reports() const noexcept;
+    [[nodiscard]] std::uint64_t framesLost() const noexcept;
     /// Called when either of both has changed by a plug or its state.
     std::function<void()> onChange;
 
@@ -97,6 +99,7 @@ private:
     std::vector<std::unique_ptr<Device>> devices_;
     unsigned lastNumber_ = 0;
     std::uint64_t reportsOfGone_ = 0;
+    std::uint64_t framesLostOfGone_ = 0;
     std::map<std::string, Settings> remembered_;
     std::deque<std::string> oldest_;
     std::function<void()> ended_;

@@ -16,6 +16,8 @@
 namespace VexaTouch::Tools::Daemon {
 namespace {
 
+constexpr const char* kBus = "org.freedesktop.DBus";
+constexpr const char* kBusPath = "/org/freedesktop/DBus";
 constexpr const char* kProperties = "org.freedesktop.DBus.Properties";
 
 bool isNobodyThere(const std::string& name) {
@@ -47,22 +49,42 @@ unsigned numberOf(const std::string& path) {
 
 }  // namespace
 
-DaemonClient::DaemonClient(const std::string& bus) try : where_(bus), bus_(bus) {
+DaemonClient::DaemonClient(const std::string& bus, const std::string& otherwise) try
+    : where_(bus), otherwise_(otherwise), bus_(bus) {
 } catch (const Failure& error) {
-    throw Failure(std::string("no daemon: ") + error.what() +
-                  " (with --device sim the command has a device of its own)");
+    throw Failure(std::string("no daemon: ") + error.what() + "; start the bus, or " + otherwise);
 }
 
-BusMessage DaemonClient::ask(const BusMessage& call, const std::string& what) {
+std::unique_ptr<DaemonClient> DaemonClient::whereThereIsOne(const std::string& bus) {
+    std::unique_ptr<DaemonClient> client;
+    try {
+        client = std::make_unique<DaemonClient>(bus);
+    } catch (const Failure&) {
+        return nullptr;
+    }
+    BusMessage call = client->bus_.call(kBus, kBusPath, kBus, "GetNameOwner");
+    call.string(BusNames::kService);
+    try {
+        client->bus_.ask(call);
+    } catch (const BusError& error) {
+        if (isNobodyThere(error.name())) {
+            return nullptr;
+        }
+        throw Failure(std::string(error.what()) + " (" + error.name() + ')');
+    }
+    return client;
+}
+
+BusMessage DaemonClient::ask(const BusMessage& call) {
     try {
         return bus_.ask(call);
     } catch (const BusError& error) {
         if (isNobodyThere(error.name())) {
             throw Failure("no daemon runs on the bus \"" + where_ +
-                          "\": start it with systemctl start vexatouch or vexatouch daemon, or "
-                          "give the command a device of its own with --device sim");
+                          "\": start it with systemctl start vexatouch or vexatouch daemon, or " +
+                          otherwise_);
         }
-        throw Failure((what.empty() ? "" : what + ": ") + error.what() + " (" + error.name() + ')');
+        throw Failure(std::string(error.what()) + " (" + error.name() + ')');
     }
 }
 
@@ -71,10 +93,9 @@ BusMessage DaemonClient::deviceCall(const std::string& path, const char* member)
 }
 
 std::string DaemonClient::owner() {
-    constexpr const char* kBus = "org.freedesktop.DBus";
-    BusMessage call = bus_.call(kBus, "/org/freedesktop/DBus", kBus, "GetNameOwner");
+    BusMessage call = bus_.call(kBus, kBusPath, kBus, "GetNameOwner");
     call.string(BusNames::kService);
-    return ask(call, "").readString();
+    return ask(call).readString();
 }
 
 bool DaemonClient::readProperties(Device& device) {
@@ -93,8 +114,7 @@ bool DaemonClient::readProperties(Device& device) {
 
 std::vector<DaemonClient::Device> DaemonClient::devices() {
     BusMessage reply = ask(
-        bus_.call(BusNames::kService, BusNames::kManagerPath, BusNames::kManager, "ListDevices"),
-        "");
+        bus_.call(BusNames::kService, BusNames::kManagerPath, BusNames::kManager, "ListDevices"));
     std::vector<Device> devices;
     reply.enter('a', "o");
     while (!reply.atEnd()) {
@@ -130,7 +150,15 @@ std::string DaemonClient::choose(const Arguments& arguments) {
 Vexa::PropertyValue DaemonClient::get(const std::string& path, const std::string& key) {
     BusMessage call = deviceCall(path, "Get");
     call.text(key);
-    return ask(call, "").readAnyValue();
+    return ask(call).readAnyValue();
+}
+
+Vexa::PropertyValue DaemonClient::find(const std::string& path, const std::string& key) {
+    try {
+        return get(path, key);
+    } catch (const Failure&) {
+        return {};
+    }
 }
 
 Vexa::PropertyValue DaemonClient::set(const std::string& path, const std::string& key,
@@ -142,19 +170,19 @@ Vexa::PropertyValue DaemonClient::set(const std::string& path, const std::string
     } catch (const BusError& error) {
         throw Failure(key + ": " + error.what() + " (" + error.name() + ')');
     }
-    return ask(call, "").readAnyValue();
+    return ask(call).readAnyValue();
 }
 
 std::string DaemonClient::recording(const std::string& path) {
-    return readAll(ask(deviceCall(path, "GetRecording"), "").readDescriptor());
+    return readAll(ask(deviceCall(path, "GetRecording")).readDescriptor());
 }
 
 FileDescriptor DaemonClient::recordStream(const std::string& path) {
-    return ask(deviceCall(path, "RecordStream"), "").readDescriptor();
+    return ask(deviceCall(path, "RecordStream")).readDescriptor();
 }
 
 Vexa::PropertyValue DaemonClient::statistics(const std::string& path) {
-    return ask(deviceCall(path, "GetStatistics"), "").readDictionary();
+    return ask(deviceCall(path, "GetStatistics")).readDictionary();
 }
 
 }  // namespace VexaTouch::Tools::Daemon

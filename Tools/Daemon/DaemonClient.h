@@ -5,6 +5,7 @@
 #include "Tools/Daemon/Bus.h"
 #include "Tools/FileDescriptor.h"
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -20,8 +21,15 @@ public:
         Vexa::PropertyValue properties;  ///< of its interface, by name
     };
 
-    /// Throws Failure when the bus or the daemon does not answer.
-    explicit DaemonClient(const std::string& bus);
+    static constexpr const char* kOwnDeviceHint =
+        "give the command a device of its own with --device sim";
+
+    /// `otherwise` is what the command can do without a daemon, for messages. Throws Failure when
+    /// the bus does not answer; so does each operation when the daemon does not.
+    explicit DaemonClient(const std::string& bus, const std::string& otherwise = kOwnDeviceHint);
+    /// Null when the bus cannot be reached, or no daemon is on it. Throws Failure when the bus
+    /// fails otherwise.
+    static std::unique_ptr<DaemonClient> whereThereIsOne(const std::string& bus);
 
     /// The unique name of the daemon's connection, which its signals come from.
     [[nodiscard]] std::string owner();
@@ -31,6 +39,8 @@ public:
     [[nodiscard]] std::string choose(const Arguments& arguments);
 
     [[nodiscard]] Vexa::PropertyValue get(const std::string& path, const std::string& key);
+    /// The same; no value when the daemon gives none, whatever the reason.
+    [[nodiscard]] Vexa::PropertyValue find(const std::string& path, const std::string& key);
     /// Gives what the property is afterwards.
     Vexa::PropertyValue set(const std::string& path, const std::string& key,
                             const Vexa::PropertyValue& value);
@@ -46,9 +56,10 @@ private:
     /// False when it was unplugged meanwhile.
     bool readProperties(Device& device);
     [[nodiscard]] BusMessage deviceCall(const std::string& path, const char* member) const;
-    BusMessage ask(const BusMessage& call, const std::string& what);
+    BusMessage ask(const BusMessage& call);
 
     std::string where_;
+    std::string otherwise_;
     Bus bus_;
 };
 
@@ -57,7 +68,7 @@ inline constexpr OptionEntry kSurfaceOption = {
     .name = "--surface",
     .valueName = "N",
     .help =
-        "The daemon's surface with this number (vexatouch stats lists them); not needed when "
+        "The daemon's surface with this number (vexatouch devices lists them); not needed when "
         "there is only one"};
 
 }  // namespace VexaTouch::Tools::Daemon

@@ -1,27 +1,31 @@
 #include "Tools/Daemon/DaemonCommand.h"
 
-#include "Host/HostFailure.h"
 #include "Host/KeyMap.h"
 #include "Host/MediaKeys.h"
 #include "Host/PluginLibrary.h"
 #include "Host/SharedKeyboard.h"
 #include "Host/SurfaceMatch.h"
-#include "Host/VirtualKeyboard.h"
 #include "Tools/Daemon/Bus.h"
 #include "Tools/Daemon/Daemon.h"
 #include "Tools/Daemon/EventLoop.h"
 #include "Tools/Daemon/PlayedSource.h"
 #include "Tools/Daemon/ServiceNotify.h"
+#include "Tools/Daemon/Watchdog.h"
 #include "Tools/Daemon/WatchedSource.h"
 #include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
+#include "Tools/KeyOptions.h"
 #include "Tools/LogOptions.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/WakeUp.h"
+
+#include <malloc.h>
 
 #include <array>
-#include <csignal>
+#include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <optional>
-#include <stdexcept>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -32,16 +36,8 @@ namespace {
 
 constexpr std::array<OptionEntry, 6> kOptions = {{
     kBusOption,
-    {.name = "--match",
-     .valueName = "VENDOR:PRODUCT",
-     .help = "Take a device with these ids too, whatever its report descriptor says; hexadecimal",
-     .repeatable = true},
-    {.name = "--key",
-     .valueName = "GESTURE:REGION=KEY",
-     .help = "Send another key for a gesture: tap:1=KEY_NEXTSONG, or none for no key",
-     .repeatable = true,
-     .kind = ValueKind::Choice,
-     .choices = "tap:1= tap:2= tap:3= hold:1= hold:2= hold:3="},
+    kMatchOption,
+    kKeyOption,
     {.name = "--no-keys", .help = "Send no keys at all"},
     {.name = "--device",
      .valueName = "DEVICE",
@@ -72,14 +68,17 @@ constexpr std::string_view kDescription =
     "or "
     "later, gets an instance of the service plug-in of its own and an object on the message bus; "
     "when it is unplugged both are taken down, and when it comes back a new instance takes over "
-    "with the settings that were in force. Gestures become media keys of a virtual keyboard.\n"
+    "with the settings that were in force. Gestures become media keys of a virtual keyboard, made "
+    "through /dev/uinput unless the environment variable VEXATOUCH_UINPUT names another node; "
+    "where there is none the daemon says what to do and goes on without.\n"
     "\n"
     "On the bus it is org.vexatouch.Touch1: whoever sits at the machine may watch gestures, states "
     "and settings; to change settings and to see raw touches takes root or the group vexatouch. "
-    "vexatouch monitor, get, set, record and stats talk to it.\n"
+    "vexatouch monitor, get, set, record, stats and devices talk to it.\n"
     "\n"
     "Under systemd it says when it is ready, what it serves, and answers the watchdog as long as "
-    "the input thread of every surface answers; anywhere else it just runs.";
+    "the input thread of every surface answers; anywhere else it just runs. A second signal while "
+    "surfaces are being taken down ends it at once, by that signal.";
 
 class KeyListener final : public Daemon::EventListener {
 public:
@@ -92,37 +91,6 @@ public:
 private:
     Host::MediaKeys keys_;
 };
-
-Host::KeyMap parseKeys(const Arguments& arguments) {
-    if (arguments.given("--no-keys") && arguments.given("--key")) {
-        throw UsageError("--no-keys and --key contradict each other");
-    }
-    Host::KeyMap map;
-    for (const std::string& text : arguments.values("--key")) {
-        try {
-            map.assign(text);
-        } catch (const std::invalid_argument& error) {
-            throw UsageError("--key " + text + ": " + error.what());
-        }
-    }
-    return map;
-}
-
-/// None, with the reason on the error stream, where there is no keyboard to be had.
-std::unique_ptr<Host::SharedKeyboard> makeKeyboard(const Arguments& arguments,
-                                                   const Host::KeyMap& map, Streams& streams) {
-    const std::vector<Host::KeyCode> keys = map.keys();
-    if (arguments.given("--no-keys") || keys.empty()) {
-        return nullptr;
-    }
-    try {
-        return std::make_unique<Host::SharedKeyboard>(
-            std::make_unique<Host::VirtualKeyboard>(keys));
-    } catch (const Host::HostFailure& error) {
-        streams.error << "vexatouch daemon: going on without keys: " << error.what() << std::endl;
-        return nullptr;
-    }
-}
 
 std::unique_ptr<Daemon::DeviceSource> makeSource(const Arguments& arguments, Streams& streams) {
     const std::vector<std::string>& devices = arguments.values("--device");
@@ -146,39 +114,36 @@ std::unique_ptr<Daemon::DeviceSource> makeSource(const Arguments& arguments, Str
 
 std::string statusText(const Daemon::Daemon& daemon) {
     const std::size_t surfaces = daemon.surfaces();
+    const std::uint64_t framesLost = daemon.framesLost();
+    const std::string lost = framesLost > 0 ? ", " + std::to_string(framesLost) + " lost" : "";
     return std::to_string(surfaces) + (surfaces == 1 ? " surface, " : " surfaces, ") +
-           std::to_string(daemon.reports()) + " frames";
+           std::to_string(daemon.reports()) + " frames" + lost;
+}
+
+/// What a large message took goes back to the system at once. Left alone, the C library keeps more
+/// the larger the blocks are that were freed, up to 64 MiB.
+void keepNoFreedMemory() {
+    constexpr int kBytes = 128 * 1024;
+    mallopt(M_MMAP_THRESHOLD, kBytes);
+    mallopt(M_TRIM_THRESHOLD, kBytes);
 }
 
 int runDaemon(const Arguments& arguments, Streams& streams) {
-    const Host::KeyMap map = parseKeys(arguments);
+    keepNoFreedMemory();
+    if (arguments.given("--no-keys") && arguments.given(kKeyOption.name)) {
+        throw UsageError("--no-keys and --key contradict each other");
+    }
+    const Host::KeyMap map = parseKeyMap(arguments.values(kKeyOption.name));
     const LogOptions logging(arguments.values(kLogOption.name));
+    // Signals are set up before there is any other thread, so that none is bothered by them.
+    const WakeUp wake;
+    SignalWatch signals(wake);
     Daemon::EventLoop loop;
-    Daemon::Daemon* running = nullptr;
-    const auto end = [&] {
-        Daemon::ServiceNotify::stopping();
-        running->end([&loop] { loop.stop(); });
-    };
-    // Signals are blocked before there is any other thread.
-    bool ending = false;
-    const std::array signals = {SIGINT, SIGTERM, SIGHUP};
-    const auto signalWatch = loop.watchSignals(signals, [&](int) {
-        if (std::exchange(ending, true)) {
-            throw Failure("ended by a second signal while surfaces were being taken down");
-        }
-        end();
-    });
     const auto source = makeSource(arguments, streams);
-    const auto keyboard = makeKeyboard(arguments, map, streams);
+    const bool wantsKeys = !arguments.given("--no-keys") && !map.keys().empty();
+    const auto keyboard = wantsKeys ? makeKeyboard(map, "daemon", streams) : nullptr;
     const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
     Daemon::Bus bus(arguments.value(kBusOption.name));
-    bool lost = false;
-    bus.attach(loop, [&] {
-        lost = true;
-        if (!std::exchange(ending, true)) {
-            end();
-        }
-    });
     Daemon::DaemonOptions options{.rights = Daemon::RightsPolicy::ofThisSystem()};
     if (keyboard) {
         options.listener = [&]() -> std::unique_ptr<Daemon::EventListener> {
@@ -186,31 +151,33 @@ int runDaemon(const Arguments& arguments, Streams& streams) {
         };
     }
     Daemon::Daemon daemon(loop, bus, library, *source, std::move(options), streams.error);
-    running = &daemon;
+    bool ending = false;
+    const auto end = [&] {
+        if (!std::exchange(ending, true)) {
+            Daemon::ServiceNotify::stopping();
+            daemon.end([&loop] { loop.stop(); });
+        }
+    };
+    bool lost = false;
+    bus.attach(loop, [&] {
+        lost = true;
+        end();
+    });
+    const auto signalWatch = loop.watch(wake, [&] {
+        if (signals.endWanted()) {
+            end();
+        }
+    });
     const auto tellStatus = [&] {
         Daemon::ServiceNotify::status(statusText(daemon));
         if (const auto failure = keyboard ? keyboard->takeFailure() : std::nullopt) {
-            streams.error << "vexatouch daemon: going on without keys: " << *failure << std::endl;
+            streams.error << "vexatouch daemon: " << *failure << std::endl;
         }
     };
     daemon.onChange = tellStatus;
     Daemon::ServiceNotify::ready();
     tellStatus();
-    Daemon::EventLoop::WatchHandle watchdog;
-    bool asked = false;
-    if (const auto interval = Daemon::ServiceNotify::watchdog()) {
-        watchdog = loop.every(*interval / 2, [&] {
-            // Whoever has not answered the last time is not asked again, and the manager not told.
-            if (std::exchange(asked, true)) {
-                return;
-            }
-            daemon.ping([&] {
-                asked = false;
-                Daemon::ServiceNotify::alive();
-                tellStatus();
-            });
-        });
-    }
+    const Daemon::Watchdog watchdog(loop, daemon, tellStatus);
     loop.run();
     if (lost) {
         throw Failure("the connection to the bus was lost");

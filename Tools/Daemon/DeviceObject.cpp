@@ -7,7 +7,9 @@
 #include <systemd/sd-bus.h>
 
 #include <array>
+#include <cstddef>
 #include <cstring>
+#include <exception>
 #include <memory>
 #include <string_view>
 #include <utility>
@@ -18,7 +20,25 @@ namespace {
 using Vexa::PropertyValue;
 
 const std::string kRecordingKey = "Recording";
-const std::string kEventStatsKey = "Pipeline.Algs.EventStats";
+
+/// Of the texts and bytes in it, which are what can be large.
+std::size_t sizeInMemory(const PropertyValue& value) {
+    std::size_t size = 0;
+    if (const auto text = value.asString()) {
+        size = text->size();
+    } else if (const auto bytes = value.asBytes()) {
+        size = bytes->size();
+    } else if (const auto elements = value.asArray()) {
+        for (const PropertyValue& element : *elements) {
+            size += sizeInMemory(element);
+        }
+    } else if (const auto members = value.asDictionary()) {
+        for (const auto& [key, member] : *members) {
+            size += key.size() + sizeInMemory(member);
+        }
+    }
+    return size;
+}
 
 template <void (DeviceObject::*Method)(BusMessage)>
 int serveValue(sd_bus_message* call, void* context, sd_bus_error* /*error*/) {
@@ -167,9 +187,11 @@ void DeviceObject::get(BusMessage call) {
     const std::string key = call.readKey();
     PropertyRules::checkRead(key);
     demand(call, PropertyRules::rightToRead(key), [this, call, key] {
-        instance_.get(key, [call](const Outcome<PropertyValue>& outcome) {
-            Bus::answer(call, outcome.error,
-                        [&](BusMessage& reply) { reply.value(*outcome.value); });
+        instance_.get(key, [this, call](const Outcome<PropertyValue>& outcome) {
+            Bus::answer(call, outcome.error, [&](BusMessage& reply) {
+                bus_.demandRoom(sizeInMemory(*outcome.value));
+                reply.value(*outcome.value);
+            });
         });
     });
 }
@@ -196,8 +218,9 @@ void DeviceObject::reset(const BusMessage& call) {
 
 void DeviceObject::getRecording(const BusMessage& call) {
     demand(call, Right::Control, [this, call] {
-        instance_.get(kRecordingKey, [call](const Outcome<PropertyValue>& outcome) {
+        instance_.get(kRecordingKey, [this, call](const Outcome<PropertyValue>& outcome) {
             Bus::answer(call, outcome.error, [&](BusMessage& reply) {
+                bus_.demandRoom(sizeInMemory(*outcome.value));
                 const auto text = outcome.value->asString();
                 reply.descriptor(sealedFile(text ? *text : std::string_view()));
             });
@@ -221,7 +244,7 @@ void DeviceObject::recordStream(const BusMessage& call) {
                 Bus::answer(call, outcome.error,
                             [&](BusMessage& reply) { reply.descriptor(*reader); });
             });
-        } catch (const BusError&) {
+        } catch (const std::exception&) {
             streams_.abandon(opened.feed);
             throw;
         }
@@ -238,29 +261,19 @@ void DeviceObject::getStatistics(const BusMessage& call) {
             answer({});
             return;
         }
-        instance_.get(kEventStatsKey, [answer](const Outcome<PropertyValue>& outcome) {
-            answer(outcome.value ? *outcome.value : PropertyValue());
-        });
+        instance_.get(SurfaceInstance::kEventStatsKey,
+                      [answer](const Outcome<PropertyValue>& outcome) {
+                          answer(outcome.value ? *outcome.value : PropertyValue());
+                      });
     });
 }
 
 PropertyValue DeviceObject::statistics(const PropertyValue& eventStats) const {
-    const ReportCounts counts = instance_.counts();
-    PropertyValue::Dictionary all = {
-        {"Reports", counts.reports},
-        {"Images", counts.images},
-        {"FirmwareEvents", counts.firmwareEvents},
-        {"InvalidReports", counts.invalid},
-        {"Gaps", counts.gaps},
-        {"FramesLost", counts.framesLost},
-        {"Gestures", instance_.gestures()},
-        {"GesturesDropped", dropped_},
-        {"RecordStreams", std::uint64_t{streams_.count(path_)}},
-        {"RecordReportsLost", streams_.lost(path_)},
-    };
-    if (eventStats) {
-        all.emplace("EventStats", eventStats);
-    }
+    PropertyValue::Dictionary all =
+        statisticsOf(instance_.counts(), instance_.gestures(), eventStats);
+    all.emplace("GesturesDropped", dropped_);
+    all.emplace("RecordStreams", std::uint64_t{streams_.count(path_)});
+    all.emplace("RecordReportsLost", streams_.lost(path_));
     return all;
 }
 

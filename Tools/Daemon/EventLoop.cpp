@@ -2,18 +2,14 @@
 
 #include "Tools/Failure.h"
 
-#include <pthread.h>
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
-#include <sys/signalfd.h>
 #include <systemd/sd-event.h>
 #include <unistd.h>
 
 #include <cerrno>
-#include <csignal>
 #include <cstring>
 #include <exception>
-#include <optional>
 #include <string>
 #include <utility>
 
@@ -31,12 +27,7 @@ void check(int result) {
 class EventLoop::Watch {
 public:
     explicit Watch(EventLoop& loop) noexcept : loop_(loop) {}
-    ~Watch() {
-        sd_event_source_disable_unref(source_);
-        if (previousMask) {
-            pthread_sigmask(SIG_SETMASK, &*previousMask, nullptr);
-        }
-    }
+    ~Watch() { sd_event_source_disable_unref(source_); }
     Watch(const Watch&) = delete;
     Watch(Watch&&) = delete;
     Watch& operator=(const Watch&) = delete;
@@ -45,16 +36,16 @@ public:
     void watchDescriptor(int descriptor, std::uint32_t events) {
         check(sd_event_add_io(loop_.get(), &source_, descriptor, events, &ready, this));
     }
+    void setEvents(std::uint32_t events) { check(sd_event_source_set_io_events(source_, events)); }
     void watchClock(std::chrono::microseconds interval) {
         interval_ = static_cast<std::uint64_t>(interval.count());
-        check(sd_event_add_time_relative(loop_.get(), &source_, CLOCK_MONOTONIC, interval_, 0,
-                                         &elapsed, this));
+        const std::uint64_t accuracy = interval_ / 16 + 1;
+        check(sd_event_add_time_relative(loop_.get(), &source_, CLOCK_MONOTONIC, interval_,
+                                         accuracy, &elapsed, this));
         check(sd_event_source_set_enabled(source_, SD_EVENT_ON));
     }
 
     std::function<void(std::uint32_t events)> callback;
-    FileDescriptor own;
-    std::optional<sigset_t> previousMask;
 
 private:
     // The callback may end the watch: it is kept until it has returned.
@@ -107,28 +98,16 @@ EventLoop::WatchHandle EventLoop::watch(int descriptor, std::uint32_t events,
     return made;
 }
 
-EventLoop::WatchHandle EventLoop::watchSignals(std::span<const int> signals,
-                                               std::function<void(int signal)> callback) {
-    sigset_t set{};
-    sigemptyset(&set);
-    for (const int signal : signals) {
-        sigaddset(&set, signal);
-    }
-    WatchHandle made(new Watch(*this));
-    made->own = FileDescriptor(signalfd(-1, &set, SFD_CLOEXEC | SFD_NONBLOCK));
-    check(made->own ? 0 : -errno);
-    sigset_t previous{};
-    pthread_sigmask(SIG_BLOCK, &set, &previous);
-    made->previousMask = previous;
-    const int descriptor = made->own.get();
-    made->callback = [descriptor, callback = std::move(callback)](std::uint32_t) {
-        signalfd_siginfo info{};
-        while (::read(descriptor, &info, sizeof info) == sizeof info) {
-            callback(static_cast<int>(info.ssi_signo));
-        }
-    };
-    made->watchDescriptor(descriptor, EPOLLIN);
-    return made;
+void EventLoop::setEvents(const WatchHandle& watch, std::uint32_t events) {
+    watch->setEvents(events);
+}
+
+EventLoop::WatchHandle EventLoop::watch(const WakeUp& wake, std::function<void()> callback) {
+    return watch(wake.descriptor(), EPOLLIN,
+                 [&wake, callback = std::move(callback)](std::uint32_t) {
+                     wake.clear();
+                     callback();
+                 });
 }
 
 EventLoop::WatchHandle EventLoop::every(std::chrono::microseconds interval,

@@ -3,20 +3,20 @@
 #include "Platform/Mutex.h"
 #include "Platform/ThreadAnnotations.h"
 #include "Tools/FileDescriptor.h"
+#include "Tools/WakeUp.h"
 
 #include <chrono>
 #include <cstdint>
 #include <deque>
 #include <functional>
 #include <memory>
-#include <span>
 
 struct sd_event;
 
 namespace VexaTouch::Tools::Daemon {
 
-/// The one loop of the daemon and its clients: it waits for descriptors, signals and what other
-/// threads hand to it, and wakes for nothing else. One thread, but for post().
+/// The one loop of the daemon and its clients: it waits for descriptors and what other threads
+/// hand to it, and wakes for nothing else. One thread, but for post().
 ///
 /// What is called back may throw; the exception ends the run and comes out of it.
 class EventLoop {
@@ -40,11 +40,12 @@ public:
     /// end to hang up.
     [[nodiscard]] WatchHandle watch(int descriptor, std::uint32_t events,
                                     std::function<void(std::uint32_t events)> callback);
-    /// Calls back when one of the signals has come, which are blocked for the calling thread and
-    /// those that it starts, as long as they are watched.
-    [[nodiscard]] WatchHandle watchSignals(std::span<const int> signals,
-                                           std::function<void(int signal)> callback);
-    /// Calls back again and again.
+    /// Waits for other events from now on, of a watch that was made for a descriptor.
+    static void setEvents(const WatchHandle& watch, std::uint32_t events);
+    /// Calls back when notified; `wake` must outlive the watch, and nobody else waits for it.
+    [[nodiscard]] WatchHandle watch(const WakeUp& wake, std::function<void()> callback);
+    /// Calls back again and again, each time up to a sixteenth of the interval late, so that the
+    /// system may wake for several things at once.
     [[nodiscard]] WatchHandle every(std::chrono::microseconds interval,
                                     std::function<void()> callback);
 

@@ -16,7 +16,6 @@
 #include "Tools/WakeUp.h"
 
 #include <array>
-#include <csignal>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -102,8 +101,6 @@ int runMonitor(const Arguments& arguments, Streams& streams) {
     const auto duration = durationOption(arguments, "--duration");
     const std::uint64_t startNs = Util::nanosecondsFromMachTime(Vexa::HostClock::system().now());
     Daemon::EventLoop loop;
-    const std::array signals = {SIGINT, SIGTERM, SIGHUP};
-    const auto signalWatch = loop.watchSignals(signals, [&](int) { loop.stop(); });
     Daemon::DaemonClient client(arguments.value(kBusOption.name));
     std::string rule = std::string("type='signal',sender='") + client.owner() + "',interface='" +
                        Daemon::BusNames::kDevice + '\'';
@@ -141,6 +138,14 @@ int runMonitor(const Arguments& arguments, Streams& streams) {
     client.bus().attach(loop, end);
     // Tells whether there is a daemon that lets us watch; what it sends is caught already.
     const std::size_t surfaces = client.devices().size();
+    // Not before: a bus that does not answer can be left.
+    const WakeUp wake;
+    SignalWatch signals(wake);
+    const auto signalWatch = loop.watch(wake, [&] {
+        if (signals.endWanted()) {
+            loop.stop();
+        }
+    });
     streams.error << "watching " << surfaces << (surfaces == 1 ? " surface" : " surfaces")
                   << std::endl;
     if (!json) {

@@ -5,22 +5,31 @@
 
 namespace VexaTouch::Tools::Daemon {
 
-void PlayedSource::add(std::string name, std::shared_ptr<ObservedDevice> device) {
+PluggedSurface surfaceOf(std::string name, std::shared_ptr<ObservedDevice> device,
+                         DeviceHooks moreHooks) {
+    const auto text = [&](const char* key) {
+        const Vexa::PropertyValue value = device->property(key);
+        return std::string(value.asString().value_or(""));
+    };
     PluggedSurface surface;
-    surface.id = std::to_string(++last_);
-    surface.physicalPath = surface.id;
     surface.name = std::move(name);
     surface.vendor = static_cast<std::uint16_t>(device->property("VendorID").toUnsigned64());
     surface.product = static_cast<std::uint16_t>(device->property("ProductID").toUnsigned64());
-    if (const auto serial = device->property("SerialNumber").asString()) {
-        surface.serial = *serial;
-    }
-    surface.useSetter = [device](PluggedSurface::Setter set) {
-        DeviceHooks hooks;
-        hooks.onStateFrame = std::move(set);
-        device->setHooks(std::move(hooks));
+    surface.serial = text("SerialNumber");
+    surface.physicalPath = text("PhysicalPath");
+    surface.useSetter = [device, hooks = std::move(moreHooks)](PluggedSurface::Setter set) {
+        DeviceHooks all = hooks;
+        all.onStateFrame = std::move(set);
+        device->setHooks(std::move(all));
     };
     surface.open = [device = std::move(device)] { return device; };
+    return surface;
+}
+
+void PlayedSource::add(std::string name, std::shared_ptr<ObservedDevice> device) {
+    PluggedSurface surface = surfaceOf(std::move(name), std::move(device));
+    surface.id = std::to_string(++last_);
+    surface.physicalPath = surface.id;
     changes_.push_back({.added = true, .surface = std::move(surface)});
 }
 

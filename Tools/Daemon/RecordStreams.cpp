@@ -12,6 +12,7 @@
 #include <array>
 #include <cerrno>
 #include <cstring>
+#include <exception>
 #include <utility>
 
 namespace VexaTouch::Tools::Daemon {
@@ -29,8 +30,7 @@ struct RecordStreams::Stream {
     FileDescriptor writer;
     std::shared_ptr<FileDescriptor> wake;
     EventLoop::WatchHandle wakeWatch;
-    EventLoop::WatchHandle hangUpWatch;
-    EventLoop::WatchHandle roomWatch;  // while the socket is full
+    EventLoop::WatchHandle socketWatch;  // for the reader's end, and for room while it is full
 };
 
 RecordStreams::RecordStreams(EventLoop& loop) : loop_(loop) {}
@@ -63,13 +63,25 @@ RecordStreams::Opened RecordStreams::open(const std::string& owner) {
     stream.feed = feed;
     stream.writer = std::move(writer);
     stream.wake = wake;
-    stream.wakeWatch = loop_.watch(wake->get(), EPOLLIN, [this, &stream](std::uint32_t) {
-        std::uint64_t count = 0;
-        static_cast<void>(::read(stream.wake->get(), &count, sizeof count) == sizeof count);
-        pump(stream);
-    });
-    stream.hangUpWatch =
-        loop_.watch(stream.writer.get(), 0, [this, &stream](std::uint32_t) { finish(stream); });
+    try {
+        stream.wakeWatch = loop_.watch(wake->get(), EPOLLIN, [this, &stream](std::uint32_t) {
+            std::uint64_t count = 0;
+            static_cast<void>(::read(stream.wake->get(), &count, sizeof count) == sizeof count);
+            pump(stream);
+        });
+        stream.socketWatch =
+            loop_.watch(stream.writer.get(), 0, [this, &stream](std::uint32_t events) {
+                if ((events & (EPOLLHUP | EPOLLERR)) != 0) {
+                    finish(stream);
+                } else {
+                    EventLoop::setEvents(stream.socketWatch, 0);
+                    pump(stream);
+                }
+            });
+    } catch (const std::exception&) {
+        finish(stream);
+        throw;
+    }
     return {.feed = std::move(feed), .reader = std::move(reader)};
 }
 
@@ -127,16 +139,7 @@ void RecordStreams::pump(Stream& stream) {
             finish(stream);
             return;
         }
-        if (!stream.roomWatch) {
-            // The first watch is on the same socket, so this one is on a duplicate.
-            auto duplicate =
-                std::make_shared<FileDescriptor>(::fcntl(stream.writer.get(), F_DUPFD_CLOEXEC, 0));
-            stream.roomWatch =
-                loop_.watch(duplicate->get(), EPOLLOUT, [this, &stream, duplicate](std::uint32_t) {
-                    stream.roomWatch.reset();
-                    pump(stream);
-                });
-        }
+        EventLoop::setEvents(stream.socketWatch, EPOLLOUT);
         return;
     }
     if (closed) {

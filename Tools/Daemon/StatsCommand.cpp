@@ -1,8 +1,11 @@
 #include "Tools/Daemon/StatsCommand.h"
 
+#include "Host/PluginLibrary.h"
 #include "Platform/Json.h"
 #include "Tools/Daemon/DaemonClient.h"
 #include "Tools/Daemon/DaemonCommand.h"
+#include "Tools/Daemon/OwnStatistics.h"
+#include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
 #include "Tools/OptionValues.h"
 
@@ -15,21 +18,46 @@
 namespace VexaTouch::Tools {
 namespace {
 
-constexpr std::array<OptionEntry, 3> kOptions = {{
+constexpr OptionEntry kDurationOption = {
+    .name = "--duration",
+    .valueName = "TIME",
+    .help =
+        "How long to run a device of its own: 10, 10s, 500ms, 2min; without it until "
+        "everything was played, or until a signal"};
+
+constexpr std::array<OptionEntry, 7> kOptions = {{
     kBusOption,
     Daemon::kSurfaceOption,
     {.name = "--json", .help = "Print one JSON array with an object for each surface"},
+    kOwnDeviceOption,
+    kDurationOption,
+    kMatchOption,
+    kSeedOption,
 }};
 
-constexpr std::array<ExampleEntry, 2> kExamples = {{
+constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
+    {kExitSuccess, "the statistics were printed, or there is no surface"},
+    {kExitFailure,
+     "no daemon answers or it refuses, it has no surface of the number, or the plug-in or the "
+     "device cannot be used"},
+    {kExitUsage, "the command line is wrong"},
+}};
+
+constexpr std::array<ExampleEntry, 3> kExamples = {{
     {"vexatouch stats", "Shows every surface of the daemon and what it has counted"},
     {"vexatouch stats --json", "The same for a program"},
+    {"vexatouch stats --device hidraw --duration 10s",
+     "Counts for ten seconds what the surface that is plugged in sends, without a daemon"},
 }};
 
 constexpr std::string_view kDescription =
     "Shows the daemon's surfaces: number, node, name and state, and what each has counted since it "
     "was plugged in: reports, images and what of them was invalid, places at which frames are "
-    "missing and how many, gestures, and the algorithm's own counters.";
+    "missing and how many, gestures, and the algorithm's own counters.\n"
+    "\n"
+    "With --device it needs no daemon: it runs the service on a device of its own until everything "
+    "was played, for --duration, or until SIGINT, SIGTERM or SIGHUP, and then shows what that has "
+    "counted, as surface 1.";
 
 void printLines(const Daemon::DaemonClient::Device& device, const Vexa::PropertyValue& statistics,
                 Streams& streams) {
@@ -51,7 +79,44 @@ void printLines(const Daemon::DaemonClient::Device& device, const Vexa::Property
     }
 }
 
+Vexa::PropertyValue jsonEntry(const Daemon::DaemonClient::Device& device,
+                              const Vexa::PropertyValue& statistics) {
+    Vexa::PropertyValue::Dictionary entry = {{"Surface", std::uint64_t{device.number}},
+                                             {"Statistics", statistics}};
+    if (const auto members = device.properties.asDictionary()) {
+        for (const auto& [key, value] : *members) {
+            entry.emplace(key, value);
+        }
+    }
+    return entry;
+}
+
+int runOwn(const Arguments& arguments, Streams& streams) {
+    const std::string text = arguments.value(kOwnDeviceOption.name);
+    const DeviceChoice choice = DeviceChoice::parse(text);
+    DeviceWishes wishes;
+    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.match = matchOption(arguments, choice);
+    const auto duration = durationOption(arguments, kDurationOption.name);
+    const auto device = makeDevice(choice, wishes, streams);
+    const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
+    const Daemon::OwnStatistics own =
+        Daemon::gatherStatistics(library, text, device, duration, streams);
+    const Daemon::DaemonClient::Device shown{.number = 1, .path = {}, .properties = own.properties};
+    if (arguments.given("--json")) {
+        const Vexa::PropertyValue::Array all = {jsonEntry(shown, own.statistics)};
+        streams.out << Vexa::writeJson(all) << '\n';
+    } else {
+        printLines(shown, own.statistics, streams);
+    }
+    return kExitSuccess;
+}
+
 int runStats(const Arguments& arguments, Streams& streams) {
+    if (arguments.given(kOwnDeviceOption.name)) {
+        return runOwn(arguments, streams);
+    }
+    refuseWithoutOwnDevice(arguments, std::array{kDurationOption, kSeedOption, kMatchOption});
     const auto wanted = numberOption(arguments, Daemon::kSurfaceOption.name, 1, UINT32_MAX);
     Daemon::DaemonClient client(arguments.value(kBusOption.name));
     Vexa::PropertyValue::Array all;
@@ -62,24 +127,17 @@ int runStats(const Arguments& arguments, Streams& streams) {
         }
         any = true;
         const Vexa::PropertyValue statistics = client.statistics(device.path);
-        if (!arguments.given("--json")) {
+        if (arguments.given("--json")) {
+            all.push_back(jsonEntry(device, statistics));
+        } else {
             printLines(device, statistics, streams);
-            continue;
         }
-        Vexa::PropertyValue::Dictionary entry = {{"Surface", std::uint64_t{device.number}},
-                                                 {"Statistics", statistics}};
-        if (const auto members = device.properties.asDictionary()) {
-            for (const auto& [key, value] : *members) {
-                entry.emplace(key, value);
-            }
-        }
-        all.emplace_back(entry);
-    }
-    if (arguments.given("--json")) {
-        streams.out << Vexa::writeJson(Vexa::PropertyValue(std::move(all))) << '\n';
     }
     if (wanted && !any) {
         throw Failure("there is no surface " + std::to_string(*wanted));
+    }
+    if (arguments.given("--json")) {
+        streams.out << Vexa::writeJson(Vexa::PropertyValue(std::move(all))) << '\n';
     }
     if (!any) {
         streams.error << "no surface is plugged in\n";
@@ -95,7 +153,7 @@ constinit const Command statsCommand = {
     .description = kDescription,
     .positionals = {},
     .options = kOptions,
-    .exitCodes = usualExitCodes,
+    .exitCodes = kExitCodes,
     .examples = kExamples,
     .run = runStats,
 };

@@ -3,108 +3,127 @@
 #include "Tools/Daemon/EventLoop.h"
 #include "Tools/Failure.h"
 #include "Tools/FrameFeed.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/WakeUp.h"
 
 #include <fcntl.h>
 #include <sys/epoll.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
-#include <csignal>
 #include <span>
 #include <stdexcept>
-#include <string>
 
 namespace VexaTouch::Tools::Daemon {
 namespace {
 
-/// Puts frames and what is missing between them into the stream, up to a number of reports.
-class FrameTaker {
-public:
-    FrameTaker(RecordingStream& stream, std::optional<std::uint64_t> count)
-        : stream_(stream), count_(count) {}
+using std::chrono::microseconds;
 
-    void take(const RecordedFrame& frame) {
-        if (isFull()) {
-            return;
+/// Reads frames from a descriptor and writes them until there is a reason to end.
+class StreamWriter {
+public:
+    StreamWriter(const FileDescriptor& frames, const StreamedRecordOptions& options,
+                 RecordingStream& stream, Streams& streams)
+        : frames_(frames),
+          stream_(stream),
+          keeper_(stream, options.count, streams),
+          signals_(wake_),
+          decoder_({.onFrame = [this](const RecordedFrame& frame) { keeper_.take(frame); },
+                    .onGap = [this](const FrameGap& gap) { keeper_.take(gap); }}) {
+        signalWatch_ = loop_.watch(wake_, [this] {
+            if (signals_.endWanted()) {
+                loop_.stop();
+            }
+        });
+        frameWatch_ = loop_.watch(frames.get(), EPOLLIN, [this](std::uint32_t) { read(); });
+        if (options.duration) {
+            deadline_ = loop_.every(std::chrono::duration_cast<microseconds>(*options.duration),
+                                    [this] { loop_.stop(); });
         }
-        latestNs_ = frame.timestamp;
-        ++(frame.type == RecordedFrame::Type::InputReport ? summary_.reports : summary_.settings);
-        stream_.add(frame);
-    }
-    void take(const FrameGap& gap) {
-        if (isFull()) {
-            return;
+        if (streams.errorIsTerminal) {
+            constexpr auto kDrawInterval = std::chrono::milliseconds(100);
+            drawWatch_ = loop_.every(kDrawInterval, [this] { keeper_.drawProgress(); });
         }
-        summary_.lost.reports += gap.reports;
-        summary_.lost.settings += gap.settings;
-        add("Recording.LostReports", gap.reports);
-        add("Recording.LostSettings", gap.settings);
     }
-    [[nodiscard]] bool isFull() const { return count_ && summary_.reports >= *count_; }
-    [[nodiscard]] const RecordSummary& summary() const { return summary_; }
+
+    void run() {
+        try {
+            loop_.run();
+        } catch (...) {
+            keeper_.eraseProgress();
+            throw;
+        }
+        keeper_.eraseProgress();
+    }
+    [[nodiscard]] bool isFarEndGone() const { return gone_; }
+    [[nodiscard]] const RecordSummary& summary() const { return keeper_.summary(); }
 
 private:
-    void add(const char* key, std::uint64_t count) {
-        if (count > 0) {
-            RecordedFrame frame;
-            frame.type = RecordedFrame::Type::State;
-            frame.timestamp = latestNs_;
-            frame.key = key;
-            frame.value = count;
-            stream_.add(frame);
+    void read() {
+        std::array<std::uint8_t, 65'536> bytes{};
+        const ssize_t got = ::read(frames_.get(), bytes.data(), bytes.size());
+        if (got > 0) {
+            decoder_.write(std::span(bytes).first(static_cast<std::size_t>(got)));
+            flush();
+        }
+        gone_ = got == 0 || (got < 0 && errno != EAGAIN && errno != EINTR);
+        if (gone_ || keeper_.isFull()) {
+            loop_.stop();
+        }
+    }
+    void flush() {
+        stream_.flush();
+        // When nothing comes any more, what came last is made safe in time all the same.
+        const auto due = stream_.syncDue();
+        if (due && !syncWatch_) {
+            const auto left =
+                std::chrono::duration_cast<microseconds>(*due - std::chrono::steady_clock::now());
+            syncWatch_ = loop_.every(std::max(left, microseconds(0)) + microseconds(1), [this] {
+                syncWatch_.reset();
+                flush();
+            });
         }
     }
 
+    const FileDescriptor& frames_;
     RecordingStream& stream_;
-    std::optional<std::uint64_t> count_;
-    RecordSummary summary_;
-    std::uint64_t latestNs_ = 0;
+    RecordKeeper keeper_;
+    bool gone_ = false;
+    WakeUp wake_;
+    SignalWatch signals_;
+    FrameDecoder decoder_;
+    EventLoop loop_;
+    EventLoop::WatchHandle signalWatch_;
+    EventLoop::WatchHandle frameWatch_;
+    EventLoop::WatchHandle deadline_;
+    EventLoop::WatchHandle drawWatch_;
+    EventLoop::WatchHandle syncWatch_;
 };
 
 }  // namespace
 
 RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
-                             RecordingStream& stream) {
-    FrameTaker taker(stream, options.count);
-    FrameDecoder decoder({.onFrame = [&](const RecordedFrame& frame) { taker.take(frame); },
-                          .onGap = [&](const FrameGap& gap) { taker.take(gap); }});
+                             RecordingStream& stream, Streams& streams) {
     static_cast<void>(::fcntl(frames.get(), F_SETFL, O_NONBLOCK));
-    bool gone = false;
-    EventLoop loop;
-    const std::array signals = {SIGINT, SIGTERM, SIGHUP};
-    const auto signalWatch = loop.watchSignals(signals, [&](int) { loop.stop(); });
-    const auto frameWatch = loop.watch(frames.get(), EPOLLIN, [&](std::uint32_t) {
-        std::array<std::uint8_t, 65'536> bytes{};
-        const ssize_t got = ::read(frames.get(), bytes.data(), bytes.size());
-        if (got > 0) {
-            decoder.write(std::span(bytes).first(static_cast<std::size_t>(got)));
-            stream.flush();
-        }
-        gone = got == 0 || (got < 0 && errno != EAGAIN && errno != EINTR);
-        if (gone || taker.isFull()) {
-            loop.stop();
-        }
-    });
-    const auto microseconds = [](std::chrono::nanoseconds time) {
-        return std::chrono::duration_cast<std::chrono::microseconds>(time);
-    };
-    const auto deadline = options.duration
-                              ? loop.every(microseconds(*options.duration), [&] { loop.stop(); })
-                              : nullptr;
+    StreamWriter writer(frames, options, stream, streams);
     try {
-        loop.run();
+        writer.run();
+    } catch (const Failure&) {
+        // The file says itself as far as where it is safe.
+        throw;
     } catch (const std::runtime_error& error) {
         stream.finish();
         throw Failure(error.what());
     }
     stream.finish();
-    if (gone) {
+    if (writer.isFarEndGone()) {
         throw Failure(
             "the surface was unplugged, or the daemon has ended; what came before is in " +
             stream.name());
     }
-    return taker.summary();
+    return writer.summary();
 }
 
 }  // namespace VexaTouch::Tools::Daemon

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "Tools/FileDescriptor.h"
-#include "Tools/RecordRun.h"
+#include "Tools/RecordKeeper.h"
 #include "Tools/RecordingStream.h"
 #include "Tools/Streams.h"
 
@@ -19,8 +19,9 @@ struct StreamedRecordOptions {
 
 /// Writes the frames that come through a descriptor, as FrameDecoder reads them, until SIGINT,
 /// SIGTERM or SIGHUP, after a time or a number of reports, or when the far end is done, and
-/// finishes the recording. Throws Failure, also when the far end is done: the surface is gone then.
+/// finishes the recording. A second signal ends the process. Throws Failure, also when the far end
+/// is done: the surface is gone then.
 RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
-                             RecordingStream& stream);
+                             RecordingStream& stream, Streams& streams);
 
 }  // namespace VexaTouch::Tools::Daemon

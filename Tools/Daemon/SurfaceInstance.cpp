@@ -29,6 +29,23 @@ BusError notTaken(const std::string& key) {
 
 }  // namespace
 
+Vexa::PropertyValue::Dictionary statisticsOf(const ReportCounts& counts, std::uint64_t gestures,
+                                             const Vexa::PropertyValue& eventStats) {
+    Vexa::PropertyValue::Dictionary all = {
+        {"Reports", counts.reports},
+        {"Images", counts.images},
+        {"FirmwareEvents", counts.firmwareEvents},
+        {"InvalidReports", counts.invalid},
+        {"Gaps", counts.gaps},
+        {"FramesLost", counts.framesLost},
+        {"Gestures", gestures},
+    };
+    if (eventStats) {
+        all.emplace("EventStats", eventStats);
+    }
+    return all;
+}
+
 /// What lives on the worker, in the order in which it is made.
 struct SurfaceInstance::Parts {
     std::shared_ptr<InputTap> tap;

@@ -37,6 +37,11 @@ struct Outcome {
 /// Settings by the keys of the service.
 using Settings = std::map<std::string, Vexa::PropertyValue>;
 
+/// What a surface has counted, as the daemon tells it: "Reports", "Images", "FirmwareEvents",
+/// "InvalidReports", "Gaps", "FramesLost", "Gestures", and "EventStats" if there is a value.
+Vexa::PropertyValue::Dictionary statisticsOf(const ReportCounts& counts, std::uint64_t gestures,
+                                             const Vexa::PropertyValue& eventStats);
+
 /// Gestures in their order, and how many are missing before them.
 struct Gestures {
     std::vector<DeliveredEvent> events;
@@ -101,6 +106,9 @@ public:
              std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done);
     /// Writes back every setting as it was when the plug-in started, and forgets them.
     void reset(std::function<void(const Outcome<bool>& outcome)> done);
+    /// The algorithm's own counters, for statisticsOf.
+    static constexpr const char* kEventStatsKey = "Pipeline.Algs.EventStats";
+
     /// Fills the feed from now on. The tap is for removing it again.
     void addFeed(const std::shared_ptr<FrameFeed>& feed,
                  std::function<void(const Outcome<std::shared_ptr<InputTap>>& outcome)> done);

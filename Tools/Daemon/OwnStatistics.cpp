@@ -1,0 +1,139 @@
+#include "Tools/Daemon/OwnStatistics.h"
+
+#include "Tools/Daemon/EventLoop.h"
+#include "Tools/Daemon/PlayedSource.h"
+#include "Tools/Daemon/SurfaceInstance.h"
+#include "Tools/Failure.h"
+#include "Tools/ReportWatch.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/WakeUp.h"
+
+#include <cstdint>
+#include <utility>
+
+namespace VexaTouch::Tools::Daemon {
+namespace {
+
+using std::chrono::microseconds;
+
+/// A surface from its start to its end, on a loop of its own.
+class OwnRun {
+public:
+    OwnRun(const Host::PluginLibrary& library, const std::string& node,
+           std::shared_ptr<ObservedDevice> device, std::optional<std::chrono::nanoseconds> duration,
+           const Streams& streams)
+        : device_(std::move(device)),
+          duration_(duration),
+          signals_(wake_),
+          reportWatch_(*device_, streams.patience) {
+        signalWatch_ = loop_.watch(wake_, [this] {
+            if (signals_.endWanted()) {
+                finish();
+            }
+        });
+        DeviceHooks hooks;
+        hooks.onFinished = [this] { loop_.post([this] { finish(); }); };
+        SurfaceInstance::Hooks instanceHooks;
+        instanceHooks.onState = [this] { stateChanged(); };
+        instanceHooks.onGestures = [](const Gestures&) {};
+        instance_.emplace(loop_, library, surfaceOf(node, device_, std::move(hooks)), Settings(),
+                          std::move(instanceHooks));
+    }
+
+    OwnStatistics run() {
+        loop_.run();
+        if (!failure_.empty()) {
+            throw Failure(failure_);
+        }
+        const PluggedSurface& surface = instance_->surface();
+        return {
+            .properties = Vexa::PropertyValue::Dictionary{{"Name", surface.name},
+                                                          {"Node", ""},
+                                                          {"PhysicalPath", surface.physicalPath},
+                                                          {"Product", surface.product},
+                                                          {"Reason", ""},
+                                                          {"Serial", surface.serial},
+                                                          {"State", "running"},
+                                                          {"Vendor", surface.vendor}},
+            .statistics = statisticsOf(instance_->counts(), instance_->gestures(), eventStats_)};
+    }
+
+private:
+    void stateChanged() {
+        if (instance_->state() == SurfaceInstance::State::Failed) {
+            fail(instance_->reason());
+        }
+        if (instance_->state() != SurfaceInstance::State::Running) {
+            return;
+        }
+        if (duration_) {
+            deadline_ = loop_.every(std::chrono::duration_cast<microseconds>(*duration_),
+                                    [this] { finish(); });
+        }
+        lookWatch_ =
+            loop_.every(std::chrono::duration_cast<microseconds>(reportWatch_.interval()), [this] {
+                if (reportWatch_.look()) {
+                    fail(ReportWatch::kFault);
+                }
+            });
+        if (const int hangUp = device_->hangUpDescriptor(); hangUp >= 0) {
+            hangUpWatch_ =
+                loop_.watch(hangUp, 0, [this](std::uint32_t) { fail("the device was unplugged"); });
+        }
+        if (finishWanted_) {
+            finish();
+        }
+    }
+
+    /// Asks for the algorithm's counters, and then takes everything down.
+    void finish() {
+        finishWanted_ = true;
+        if (isEnding_ || instance_->state() != SurfaceInstance::State::Running) {
+            return;
+        }
+        isEnding_ = true;
+        instance_->get(SurfaceInstance::kEventStatsKey,
+                       [this](const Outcome<Vexa::PropertyValue>& outcome) {
+                           eventStats_ = outcome.value.value_or(Vexa::PropertyValue());
+                           end();
+                       });
+    }
+    void fail(const std::string& reason) {
+        failure_ = failure_.empty() ? reason : failure_;
+        if (!std::exchange(isEnding_, true)) {
+            end();
+        }
+    }
+    void end() {
+        deadline_.reset();
+        lookWatch_.reset();
+        hangUpWatch_.reset();
+        instance_->end([this] { loop_.stop(); });
+    }
+
+    std::shared_ptr<ObservedDevice> device_;
+    std::optional<std::chrono::nanoseconds> duration_;
+    WakeUp wake_;
+    SignalWatch signals_;
+    ReportWatch reportWatch_;
+    bool finishWanted_ = false;
+    bool isEnding_ = false;
+    std::string failure_;
+    Vexa::PropertyValue eventStats_;
+    EventLoop loop_;
+    EventLoop::WatchHandle signalWatch_;
+    EventLoop::WatchHandle deadline_;
+    EventLoop::WatchHandle lookWatch_;
+    EventLoop::WatchHandle hangUpWatch_;
+    std::optional<SurfaceInstance> instance_;
+};
+
+}  // namespace
+
+OwnStatistics gatherStatistics(const Host::PluginLibrary& library, const std::string& node,
+                               const std::shared_ptr<ObservedDevice>& device,
+                               std::optional<std::chrono::nanoseconds> duration, Streams& streams) {
+    return OwnRun(library, node, device, duration, streams).run();
+}
+
+}  // namespace VexaTouch::Tools::Daemon
