@@ -146,6 +146,14 @@ TEST_F(BusValueTest, SizeAndDepthAreBounded) {
     EXPECT_THROW(static_cast<void>(through(std::string(BusValue::kMostBytes, 'x'))), BusError);
     EXPECT_THROW(static_cast<void>(through(PropertyValue::Array(BusValue::kMostBytes / 8 + 1, 1))),
                  BusError);
+    // What is next to nothing in the message is a value in memory all the same.
+    for (const PropertyValue& nothing :
+         {PropertyValue::null(), PropertyValue(), PropertyValue(PropertyValue::Array{}),
+          PropertyValue(PropertyValue::Dictionary{})}) {
+        EXPECT_THROW(
+            static_cast<void>(through(PropertyValue::Array(BusValue::kMostBytes / 8 + 1, nothing))),
+            BusError);
+    }
     PropertyValue deep = 1;
     for (int i = 0; i < BusValue::kMostLevels; ++i) {
         deep = PropertyValue::Dictionary{{"k", deep}};

@@ -1,20 +1,23 @@
 // The program itself: the daemon as a service and the commands that talk to it.
 
+#include "Platform/Json.h"
 #include "Tests/Daemon/DaemonUnderTest.h"
+#include "Tests/Daemon/ServiceManager.h"
 #include "Tests/Tools/CommandRun.h"
+#include "Tests/Tools/ProgramOnTerminal.h"
 #include "Tests/Tools/ProgramRun.h"
 #include "Tools/Daemon/BusNames.h"
 #include "Tools/EventRecord.h"
+#include "Tools/Failure.h"
 #include "Tools/RecordingFile.h"
 
 #include <gmock/gmock.h>
 
-#include <sys/socket.h>
-#include <sys/un.h>
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <array>
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
@@ -26,8 +29,11 @@ namespace VexaTouch::Testing {
 namespace {
 
 using ::testing::AllOf;
+using ::testing::Field;
 using ::testing::HasSubstr;
+using ::testing::SizeIs;
 using ::testing::StartsWith;
+using Vexa::PropertyValue;
 
 bool endedWith(int status, int exitCode) {
     return WIFEXITED(status) && WEXITSTATUS(status) == exitCode;
@@ -56,47 +62,51 @@ protected:
     TemporaryFolder folder;
 };
 
-/// The socket of a service manager.
-class Manager {
-public:
-    explicit Manager(const std::string& path) : socket_(::socket(AF_UNIX, SOCK_DGRAM, 0)) {
-        sockaddr_un address{};
-        address.sun_family = AF_UNIX;
-        std::strncpy(address.sun_path, path.c_str(), sizeof address.sun_path - 1);
-        if (::bind(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) !=
-            0) {
-            throw std::runtime_error("no socket");
-        }
-    }
-    /// Reads what it is told until it is told this.
-    std::string heardUntil(const std::string& wanted) const {
-        std::string all;
-        while (all.find(wanted) == std::string::npos) {
-            std::array<char, 512> text{};
-            const ssize_t got = ::recv(socket_.get(), text.data(), text.size(), 0);
-            all.append(text.data(), got > 0 ? static_cast<std::size_t>(got) : 0).append("\n");
-        }
-        return all;
-    }
-
-private:
-    Tools::FileDescriptor socket_;
-};
-
 TEST_F(DaemonProgramTest, TellsItsManagerWhatItServesAndThatItLives) {
-    const std::string path = folder.path("notify");
-    const Manager manager(path);
-    setenv("NOTIFY_SOCKET", path.c_str(), 1);
-    setenv("WATCHDOG_USEC", "20000", 1);
+    const ServiceManager manager(folder.path("notify"), "20000");
     ProgramRun daemon(daemonOn("sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture"));
-    unsetenv("NOTIFY_SOCKET");
-    unsetenv("WATCHDOG_USEC");
     EXPECT_THAT(manager.heardUntil("WATCHDOG=1"),
                 AllOf(StartsWith("READY=1\n"), HasSubstr("STATUS=1 surface, ")));
     ASSERT_TRUE(
         daemon.readErrorUntil("surface 1, sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture: running"));
     daemon.signal(SIGTERM);
     manager.heardUntil("STOPPING=1");
+    EXPECT_TRUE(endedWith(daemon.end(), 0));
+}
+
+TEST_F(DaemonProgramTest, ASecondSignalEndsATakeDownThatDoesNotEnd) {
+    setenv("VEXATOUCH_PLUGIN", VEXATOUCH_SAMPLE_PLUGINS "/NeverEnds.so", 1);
+    for (const int second : {SIGTERM, SIGINT}) {
+        ProgramRun daemon(daemonOn(example("taps")));
+        ASSERT_TRUE(daemon.readErrorUntil(": running"));
+        daemon.signal(SIGTERM);
+        ASSERT_TRUE(daemon.readErrorUntil("the input thread does not end"));
+        daemon.signal(second);
+        const int status = daemon.wait();
+        EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == second) << status;
+    }
+}
+
+TEST_F(DaemonProgramTest, ASecondSignalEndsAStartThatDoesNotEnd) {
+    // A pipe that nobody writes.
+    const std::string pipe = folder.path("pipe.json");
+    ASSERT_EQ(mkfifo(pipe.c_str(), 0600), 0);
+    ProgramRun daemon(daemonOn("recording:" + pipe));
+    const Tools::FileDescriptor writer(::open(pipe.c_str(), O_WRONLY | O_CLOEXEC));
+    daemon.signal(SIGTERM);
+    daemon.signal(SIGINT);
+    const int status = daemon.wait();
+    EXPECT_TRUE(WIFSIGNALED(status)) << status;
+}
+
+TEST_F(DaemonProgramTest, AHangUpIsLeftAloneUnderNohup) {
+    std::signal(SIGHUP, SIG_IGN);
+    ProgramRun daemon(daemonOn(example("taps")));
+    std::signal(SIGHUP, SIG_DFL);
+    ASSERT_TRUE(daemon.readErrorUntil(": running"));
+    daemon.signal(SIGHUP);
+    EXPECT_EQ(runCommand(atBus({"get", "Version"})).exitCode, 0);
+    daemon.signal(SIGTERM);
     EXPECT_TRUE(endedWith(daemon.end(), 0));
 }
 
@@ -131,7 +141,156 @@ TEST_F(DaemonProgramTest, WithoutADaemonTheCommandsSayWhatToDo) {
     EXPECT_EQ(folder.names(), std::vector<std::string>());
     const CommandResult none = runCommand({"get", "Version", "--bus", "unix:path=/nowhere"});
     EXPECT_EQ(none.exitCode, 1);
-    EXPECT_THAT(none.error, HasSubstr("no daemon: the bus unix:path=/nowhere does not answer"));
+    EXPECT_EQ(none.error,
+              "vexatouch get: no daemon: the bus unix:path=/nowhere does not answer: No such file "
+              "or directory; start the bus, or give the command a device of its own with --device "
+              "sim\n");
+    // The well-known ones are named by their sockets.
+    setenv("DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/nowhere/system", 1);
+    EXPECT_THAT(runCommand({"get", "Version"}).error,
+                HasSubstr("the system bus (unix:path=/nowhere/system) does not answer: No such "));
+    unsetenv("DBUS_SYSTEM_BUS_ADDRESS");
+    setenv("DBUS_SESSION_BUS_ADDRESS", "unix:path=/nowhere/session", 1);
+    EXPECT_THAT(runCommand({"get", "Version", "--bus", "session"}).error,
+                HasSubstr("the session's bus (unix:path=/nowhere/session) does not answer"));
+    unsetenv("DBUS_SESSION_BUS_ADDRESS");
+}
+
+/// What a JSON array of objects says under this key of its first element.
+PropertyValue firstOf(const std::string& json, const char* key) {
+    const PropertyValue all = Vexa::readJson(json);
+    const auto elements = all.asArray();
+    return elements && !elements->empty() ? (*elements)[0].member(key) : PropertyValue();
+}
+
+TEST_F(DaemonProgramTest, StatsOfAnOwnDeviceAreThoseOfTheDaemon) {
+    const std::string device = example("mixed");
+    DaemonUnderTest daemon(bus->address());
+    daemon.source.plug(playedSurface("7", device));
+    const CommandResult own = runCommand({"stats", "--json", "--device", device});
+    EXPECT_EQ(own.exitCode, 0) << own.error;
+    EXPECT_EQ(own.error, "");
+    const PropertyValue expected = firstOf(own.out, "Statistics");
+    EXPECT_EQ(
+        expected.member("Gestures"),
+        PropertyValue(Tools::readExpectedEvents(VEXA_SOURCE_DIR "/Examples/mixed.events").size()));
+    EXPECT_EQ(firstOf(own.out, "Surface"), PropertyValue(1U));
+    EXPECT_EQ(firstOf(own.out, "State"), PropertyValue("running"));
+    const auto members = expected.asDictionary();
+    ASSERT_TRUE(members);
+    EXPECT_THAT(*members, SizeIs(8));
+    for (const auto& [key, value] : *members) {
+        // Of the daemon's the gestures come last.
+        while (firstOf(runCommand(atBus({"stats", "--json"})).out, "Statistics").member(key) !=
+               value) {
+        }
+    }
+}
+
+TEST_F(DaemonProgramTest, StatsOfAnOwnDeviceEndAfterATimeOrAtASignal) {
+    const CommandResult timed = runCommand({"stats", "--device", "sim", "--duration", "50ms"});
+    EXPECT_EQ(timed.exitCode, 0) << timed.error;
+    EXPECT_THAT(timed.out, AllOf(StartsWith("surface 1, sim, running\n"), HasSubstr("  Reports: "),
+                                 HasSubstr("  EventStats: {")));
+    ProgramRun interrupted({"stats", "--device", "sim"});
+    ASSERT_TRUE(interrupted.readErrorUntil("random gestures"));
+    interrupted.signal(SIGINT);
+    EXPECT_TRUE(endedWith(interrupted.end(), 0));
+    EXPECT_THAT(interrupted.out(), StartsWith("surface 1, sim, running\n"));
+    setenv("VEXATOUCH_PLUGIN", "/nowhere.so", 1);
+    EXPECT_EQ(runCommand({"stats", "--device", "sim"}).exitCode, 1);
+    EXPECT_EQ(runCommand(atBus({"stats", "--duration", "1s"})).exitCode, 2);
+}
+
+TEST_F(DaemonProgramTest, DevicesAreThoseThatTheDaemonServes) {
+    DaemonUnderTest daemon(bus->address());
+    EXPECT_THAT(runCommand(atBus({"devices"})),
+                AllOf(Field(&CommandResult::exitCode, 0), Field(&CommandResult::out, ""),
+                      Field(&CommandResult::error, StartsWith("the daemon serves no touch "))));
+    auto surface = playedSurface("7", example("taps"));
+    surface.name = "Left\x1b[2J";
+    const auto open = surface.open;
+    surface.open = [open] {
+        auto device = open();
+        device->setProperty("Bus", 3U);
+        // Usage page 0xFF60, and one input report of 8 bits.
+        device->setProperty("ReportDescriptor",
+                            PropertyValue::Bytes{0x06, 0x60, 0xFF, 0x09, 0x01, 0xA1, 0x01, 0x85,
+                                                 0x01, 0x75, 0x08, 0x95, 0x01, 0x81, 0x02, 0xC0});
+        return device;
+    };
+    daemon.source.plug(surface);
+    auto broken = playedSurface("8", example("taps"));
+    broken.open = []() -> std::shared_ptr<Vexa::DeviceBackend> {
+        throw Tools::Failure("/dev/hidraw8: no permission");
+    };
+    daemon.source.plug(broken);
+    CommandResult listed;
+    do {
+        listed = runCommand(atBus({"devices"}));
+    } while (listed.out.find(", running") == std::string::npos ||
+             listed.out.find(", failed") == std::string::npos);
+    EXPECT_EQ(listed,
+              (CommandResult{0,
+                             "/dev/hidraw7  5658:5454  Left?[2J  serial serial 7  at usb-7  "
+                             "surface 1, running\n"
+                             "/dev/hidraw8  5658:5454  Surface 8  serial serial 8  at usb-8  "
+                             "surface 2, failed: /dev/hidraw8: no permission\n",
+                             ""}));
+    const CommandResult json = runCommand(atBus({"devices", "--json", "--verbose"}));
+    EXPECT_EQ(json.exitCode, 0);
+    const auto first = [&](const char* key) { return firstOf(json.out, key); };
+    EXPECT_EQ(first("node"), PropertyValue("/dev/hidraw7"));
+    EXPECT_EQ(first("vendor_id"), PropertyValue(0x5658));
+    EXPECT_EQ(first("bus"), PropertyValue(3));
+    EXPECT_EQ(first("number"), PropertyValue(1));
+    EXPECT_EQ(first("state"), PropertyValue("running"));
+    EXPECT_EQ(first("surface"), PropertyValue(true));
+    EXPECT_EQ(first("reason"), PropertyValue("the daemon serves it"));
+    EXPECT_EQ(first("report_descriptor"),
+              PropertyValue("06 60 ff 09 01 a1 01 85 01 75 08 95 01 81 02 c0 "));
+    EXPECT_THAT(runCommand(atBus({"devices", "--verbose"})).out,
+                AllOf(HasSubstr("surface 1, running\n  a surface: the daemon serves it\n"),
+                      HasSubstr("      3  09 01             Usage (0x01)\n")));
+}
+
+TEST_F(DaemonProgramTest, WithoutADaemonDevicesLooksItself) {
+    const CommandResult itself = runCommand({"devices", "--json", "--device", "hidraw"});
+    EXPECT_EQ(itself.exitCode, 0) << itself.error;
+    setenv("DBUS_SYSTEM_BUS_ADDRESS", "unix:path=/nowhere", 1);
+    EXPECT_EQ(runCommand({"devices", "--json"}), itself);
+    setenv("DBUS_SYSTEM_BUS_ADDRESS", bus->address().c_str(), 1);
+    EXPECT_EQ(runCommand({"devices", "--json"}), itself);
+    {
+        // And with one it does not.
+        DaemonUnderTest daemon(bus->address());
+        daemon.source.plug(playedSurface("7", example("taps")));
+        while (runCommand({"devices", "--json"}).out.find("/dev/hidraw7") == std::string::npos) {
+        }
+        EXPECT_EQ(runCommand({"devices", "--json", "--device", "hidraw"}), itself);
+    }
+    unsetenv("DBUS_SYSTEM_BUS_ADDRESS");
+    // Who names a bus wants the daemon on it.
+    const CommandResult none = runCommand(atBus({"devices"}));
+    EXPECT_EQ(none.exitCode, 1);
+    EXPECT_THAT(none.error,
+                AllOf(HasSubstr("no daemon runs on the bus"),
+                      HasSubstr("look at this machine's devices with --device hidraw")));
+    for (const auto& wrong : std::vector<std::vector<std::string>>{
+             {"devices", "--device", "sim"}, {"devices", "--match", "1:2", "--bus", "system"}}) {
+        EXPECT_EQ(runCommand(wrong).exitCode, 2);
+    }
+}
+
+TEST_F(DaemonProgramTest, ARecordingFromTheDaemonShowsHowFarItIs) {
+    DaemonUnderTest daemon(bus->address());
+    daemon.source.plug(playedSurface("7", "sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture", true));
+    while (runCommand(atBus({"stats"})).out.find("running") == std::string::npos) {
+    }
+    ProgramOnTerminal record(atBus({"record", folder.path("session.json")}));
+    EXPECT_TRUE(record.readUntil(" frames, 0.0 MB, "));
+    record.type("\x03");
+    EXPECT_TRUE(endedWith(record.end(), 0)) << record.output();
 }
 
 TEST_F(DaemonProgramTest, MonitorPrintsTheEventsOfTheService) {

@@ -7,12 +7,14 @@
 #include "Tools/Daemon/DaemonClient.h"
 #include "Tools/Daemon/DeviceSource.h"
 #include "Tools/Daemon/EventLoop.h"
+#include "Tools/Daemon/Watchdog.h"
 #include "Tools/DeviceChoice.h"
 #include "Tools/FileDescriptor.h"
 
 #include <sys/eventfd.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <future>
@@ -115,6 +117,20 @@ public:
         });
         done.get_future().get();
     }
+    /// Returns when the daemon's loop has seen this interval pass so often.
+    void waitForTicks(int count, std::chrono::microseconds interval) {
+        std::promise<void> done;
+        Tools::Daemon::EventLoop::WatchHandle ticks;
+        loop_.post([&] {
+            ticks = loop_.every(interval, [&] {
+                if (--count == 0) {
+                    ticks.reset();
+                    done.set_value();
+                }
+            });
+        });
+        done.get_future().get();
+    }
 
     PluggedByHand source;
 
@@ -134,6 +150,7 @@ private:
         bus.attach(loop_, [this] { loop_.stop(); });
         Tools::Daemon::Daemon daemon(loop_, bus, library_, source, {.rights = rights}, log_);
         daemon_ = &daemon;
+        const Tools::Daemon::Watchdog watchdog(loop_, daemon, [] {});
         ready.set_value();
         loop_.run();
     }

@@ -84,6 +84,7 @@ public:
         }
     }
     void signal(int number) const { kill(process_, number); }
+    [[nodiscard]] pid_t process() const { return process_; }
 
     /// Reads all that comes and gives the status as waitpid does.
     int end() {

@@ -33,6 +33,9 @@ public:
     [[nodiscard]] std::string path() const;
     [[nodiscard]] std::string member() const;
 
+    /// Keeps something as long as this message, and what is copied from it from now on, is kept.
+    void hold(std::shared_ptr<const void> what) noexcept { held_ = std::move(what); }
+
     // Writing.
     BusMessage& boolean(bool value);
     BusMessage& number32(std::uint32_t value);
@@ -82,6 +85,7 @@ private:
     void readBasic(char type, void* value);
 
     std::shared_ptr<sd_bus_message> message_;
+    std::shared_ptr<const void> held_;
 };
 
 }  // namespace VexaTouch::Tools::Daemon

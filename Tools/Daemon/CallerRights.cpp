@@ -50,6 +50,21 @@ Right RightsPolicy::rightOf(uid_t user, const std::vector<gid_t>& groups) const 
     return isOnSeat && isOnSeat(user) ? Right::Watch : Right::None;
 }
 
+void CallerRights::admit(BusMessage& call) {
+    if (waiting_.size() > kMostKnown) {
+        std::erase_if(waiting_, [](const auto& entry) { return entry.second.use_count() == 1; });
+    }
+    std::shared_ptr<const char>& waiting = waiting_[call.sender()];
+    if (!waiting) {
+        waiting = std::make_shared<const char>();
+    }
+    if (waiting.use_count() > kMostOfOne) {
+        throw BusError(ErrorName::kBusy, "too many of your calls wait; try again");
+    }
+    // Copies of the message share one reference.
+    call.hold(std::make_shared<const std::shared_ptr<const char>>(waiting));
+}
+
 void CallerRights::demand(const BusMessage& call, Right right, std::function<void()> granted) {
     const std::string sender = call.sender();
     Asked asked{.slot = {}, .call = call, .right = right, .granted = std::move(granted)};

@@ -9,6 +9,7 @@
 #include <deque>
 #include <functional>
 #include <map>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -43,11 +44,17 @@ class CallerRights {
 public:
     /// Callers that the bus is being asked about at the same time; beyond that they are told Busy.
     static constexpr std::size_t kMostAsked = 64;
+    /// Calls of one caller that wait for an answer at the same time, so that nobody takes the
+    /// places of all others.
+    static constexpr long kMostOfOne = 8;
     /// Connections whose right is remembered.
     static constexpr std::size_t kMostKnown = 256;
 
     CallerRights(Bus& bus, RightsPolicy policy) : bus_(bus), policy_(std::move(policy)) {}
 
+    /// Counts the call as waiting as long as it, or a copy made from now on, is kept. Throws
+    /// BusError (Busy) when too many of this caller wait.
+    void admit(BusMessage& call);
     /// Calls `granted` now or later if the caller has the right; otherwise the call is answered
     /// with AccessDenied, or Busy. What `granted` throws is the answer as well.
     void demand(const BusMessage& call, Right right, std::function<void()> granted);
@@ -70,6 +77,7 @@ private:
     std::deque<std::string> oldest_;
     std::map<std::uint64_t, Asked> asked_;
     std::uint64_t next_ = 0;
+    std::map<std::string, std::shared_ptr<const char>> waiting_;  // one reference a call
 };
 
 }  // namespace VexaTouch::Tools::Daemon

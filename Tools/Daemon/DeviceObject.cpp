@@ -43,14 +43,18 @@ std::size_t sizeInMemory(const PropertyValue& value) {
 template <void (DeviceObject::*Method)(BusMessage)>
 int serveValue(sd_bus_message* call, void* context, sd_bus_error* /*error*/) {
     return Bus::serve(call, [context](BusMessage message) {
-        (static_cast<DeviceObject*>(context)->*Method)(std::move(message));
+        auto& object = *static_cast<DeviceObject*>(context);
+        object.admit(message);
+        (object.*Method)(std::move(message));
     });
 }
 
 template <void (DeviceObject::*Method)(const BusMessage&)>
 int serve(sd_bus_message* call, void* context, sd_bus_error* /*error*/) {
-    return Bus::serve(call, [context](const BusMessage& message) {
-        (static_cast<DeviceObject*>(context)->*Method)(message);
+    return Bus::serve(call, [context](BusMessage message) {
+        auto& object = *static_cast<DeviceObject*>(context);
+        object.admit(message);
+        (object.*Method)(message);
     });
 }
 

@@ -34,6 +34,8 @@ public:
     void announceState();
     void announceGestures(const Gestures& gestures);
 
+    /// Comes before each method. Throws BusError (Busy).
+    void admit(BusMessage& call) { rights_.admit(call); }
     // Methods of the interface; each answers the call now or later.
     void get(BusMessage call);
     void set(BusMessage call);

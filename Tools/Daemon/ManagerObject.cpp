@@ -12,8 +12,10 @@ namespace VexaTouch::Tools::Daemon {
 namespace {
 
 int listDevices(sd_bus_message* call, void* context, sd_bus_error* /*error*/) {
-    return Bus::serve(call, [context](const BusMessage& message) {
-        static_cast<ManagerObject*>(context)->listDevices(message);
+    return Bus::serve(call, [context](BusMessage message) {
+        auto& object = *static_cast<ManagerObject*>(context);
+        object.admit(message);
+        object.listDevices(message);
     });
 }
 

@@ -25,6 +25,8 @@ public:
     void announceAdded(const std::string& path);
     void announceRemoved(const std::string& path);
 
+    /// Comes before each method. Throws BusError (Busy).
+    void admit(BusMessage& call) { rights_.admit(call); }
     // A method of the interface.
     void listDevices(const BusMessage& call);
 

@@ -1,0 +1,123 @@
+#include "Tools/Daemon/Watchdog.h"
+
+#include "Tests/Daemon/DaemonUnderTest.h"
+#include "Tests/Daemon/ServiceManager.h"
+#include "Tools/ForwardingDevice.h"
+
+#include <gmock/gmock.h>
+
+#include <chrono>
+#include <cstdlib>
+#include <future>
+#include <memory>
+#include <optional>
+#include <string>
+#include <utility>
+
+namespace VexaTouch::Testing {
+namespace {
+
+using ::testing::HasSubstr;
+
+/// A device in whose reports the input thread can be held.
+class HeldDevice final : public Tools::ForwardingDevice {
+public:
+    using ForwardingDevice::ForwardingDevice;
+
+    /// Returns when the input thread is held.
+    void hold() {
+        wanted_ = true;
+        held_.get_future().get();
+    }
+    void release() { released_.set_value(); }
+
+    void reportHandled() noexcept override {
+        ForwardingDevice::reportHandled();
+        if (wanted_.exchange(false)) {
+            held_.set_value();
+            released_.get_future().get();
+        }
+    }
+
+private:
+    std::atomic<bool> wanted_ = false;
+    std::promise<void> held_;
+    std::promise<void> released_;
+};
+
+class WatchdogTest : public ::testing::Test {
+protected:
+    static constexpr auto kPing = std::chrono::milliseconds(2);
+
+    void SetUp() override {
+        if (!PrivateBus::isThere()) {
+            GTEST_SKIP() << PrivateBus::kProgram << " is missing: script/bootstrap installs it";
+        }
+        bus.emplace();
+        setenv("VEXATOUCH_PLUGIN", VEXATOUCH_PLUGIN_FILE, 1);
+        manager.emplace(folder.path("notify"), "4000");
+        daemon.emplace(bus->address());
+    }
+    ~WatchdogTest() override { unsetenv("VEXATOUCH_PLUGIN"); }
+
+    /// Plugs a surface whose reports come for ever and waits until its input thread is held.
+    std::shared_ptr<HeldDevice> plugAndHold(const std::string& id) {
+        auto surface = playedSurface(id, "sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture", true);
+        auto opened = std::make_shared<std::promise<std::shared_ptr<HeldDevice>>>();
+        surface.open = [open = surface.open, opened] {
+            auto device = std::make_shared<HeldDevice>(open());
+            opened->set_value(device);
+            return device;
+        };
+        daemon->source.plug(std::move(surface));
+        auto device = opened->get_future().get();
+        device->hold();
+        return device;
+    }
+    /// What the manager hears while ten pings would have been due.
+    std::string heardInTenPings() {
+        // What was answered before is told before.
+        daemon->call([](Tools::Daemon::Daemon&) {});
+        static_cast<void>(manager->heard());
+        daemon->waitForTicks(10, kPing);
+        return manager->heard();
+    }
+
+    TemporaryFolder folder;
+    std::optional<PrivateBus> bus;
+    std::optional<ServiceManager> manager;
+    std::optional<DaemonUnderTest> daemon;
+};
+
+TEST_F(WatchdogTest, IsSilentWhileAnInputThreadIsStuckAndGoesOnWhenItAnswers) {
+    manager->heardUntil("WATCHDOG=1");
+    const auto device = plugAndHold("7");
+    EXPECT_EQ(heardInTenPings(), "");
+    device->release();
+    manager->heardUntil("WATCHDOG=1");
+    EXPECT_THAT(heardInTenPings(), HasSubstr("WATCHDOG=1"));
+}
+
+TEST_F(WatchdogTest, ASurfaceThatAnswersDoesNotSpeakForOneThatIsStuck) {
+    daemon->source.plug(playedSurface("8", "sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture", true));
+    const auto device = plugAndHold("7");
+    // The round that was under way may still end; no other one does.
+    static_cast<void>(heardInTenPings());
+    EXPECT_EQ(heardInTenPings(), "");
+    // Unplugged, it is taken down and waited for, and nobody says that all is well meanwhile.
+    daemon->source.unplug("7");
+    EXPECT_EQ(heardInTenPings(), "");
+    device->release();
+    manager->heardUntil("WATCHDOG=1");
+}
+
+TEST_F(WatchdogTest, WithoutAManagerThatWantsItNothingWakes) {
+    daemon.reset();
+    manager.reset();
+    manager.emplace(folder.path("other"));
+    daemon.emplace(bus->address());
+    EXPECT_EQ(heardInTenPings(), "");
+}
+
+}  // namespace
+}  // namespace VexaTouch::Testing
