@@ -164,7 +164,7 @@ PropertyValue firstOf(const std::string& json, const char* key) {
 }
 
 TEST_F(DaemonProgramTest, StatsOfAnOwnDeviceAreThoseOfTheDaemon) {
-    const std::string device = example("mixed");
+    const std::string device = example("disjoint-frames");
     DaemonUnderTest daemon(bus->address());
     daemon.source.plug(playedSurface("7", device));
     const CommandResult own = runCommand({"stats", "--json", "--device", device});
@@ -173,7 +173,8 @@ TEST_F(DaemonProgramTest, StatsOfAnOwnDeviceAreThoseOfTheDaemon) {
     const PropertyValue expected = firstOf(own.out, "Statistics");
     EXPECT_EQ(
         expected.member("Gestures"),
-        PropertyValue(Tools::readExpectedEvents(VEXA_SOURCE_DIR "/Examples/mixed.events").size()));
+        PropertyValue(
+            Tools::readExpectedEvents(VEXA_SOURCE_DIR "/Examples/disjoint-frames.events").size()));
     EXPECT_EQ(firstOf(own.out, "Surface"), PropertyValue(1U));
     EXPECT_EQ(firstOf(own.out, "State"), PropertyValue("running"));
     const auto members = expected.asDictionary();

@@ -5,8 +5,6 @@
 #include "Tools/Daemon/SurfaceInstance.h"
 #include "Tools/Failure.h"
 #include "Tools/ReportWatch.h"
-#include "Tools/SignalWatch.h"
-#include "Tools/WakeUp.h"
 
 #include <cstdint>
 #include <utility>
@@ -19,15 +17,12 @@ using std::chrono::microseconds;
 /// A surface from its start to its end, on a loop of its own.
 class OwnRun {
 public:
-    OwnRun(const Host::PluginLibrary& library, const std::string& node,
+    OwnRun(const Host::PluginLibrary& library, const std::string& name,
            std::shared_ptr<ObservedDevice> device, std::optional<std::chrono::nanoseconds> duration,
-           const Streams& streams)
-        : device_(std::move(device)),
-          duration_(duration),
-          signals_(wake_),
-          reportWatch_(*device_, streams.patience) {
-        signalWatch_ = loop_.watch(wake_, [this] {
-            if (signals_.endWanted()) {
+           const SignalWatch& signals, const WakeUp& wake, std::chrono::nanoseconds patience)
+        : device_(std::move(device)), duration_(duration), reportWatch_(*device_, patience) {
+        signalWatch_ = loop_.watch(wake, [this, &signals] {
+            if (signals.endWanted()) {
                 finish();
             }
         });
@@ -36,7 +31,7 @@ public:
         SurfaceInstance::Hooks instanceHooks;
         instanceHooks.onState = [this] { stateChanged(); };
         instanceHooks.onGestures = [](const Gestures&) {};
-        instance_.emplace(loop_, library, surfaceOf(node, device_, std::move(hooks)), Settings(),
+        instance_.emplace(loop_, library, surfaceOf(name, device_, std::move(hooks)), Settings(),
                           std::move(instanceHooks));
     }
 
@@ -113,8 +108,6 @@ private:
 
     std::shared_ptr<ObservedDevice> device_;
     std::optional<std::chrono::nanoseconds> duration_;
-    WakeUp wake_;
-    SignalWatch signals_;
     ReportWatch reportWatch_;
     bool finishWanted_ = false;
     bool isEnding_ = false;
@@ -130,10 +123,12 @@ private:
 
 }  // namespace
 
-OwnStatistics gatherStatistics(const Host::PluginLibrary& library, const std::string& node,
+OwnStatistics gatherStatistics(const Host::PluginLibrary& library, const std::string& name,
                                const std::shared_ptr<ObservedDevice>& device,
-                               std::optional<std::chrono::nanoseconds> duration, Streams& streams) {
-    return OwnRun(library, node, device, duration, streams).run();
+                               std::optional<std::chrono::nanoseconds> duration,
+                               const SignalWatch& signals, const WakeUp& wake,
+                               std::chrono::nanoseconds patience) {
+    return OwnRun(library, name, device, duration, signals, wake, patience).run();
 }
 
 }  // namespace VexaTouch::Tools::Daemon

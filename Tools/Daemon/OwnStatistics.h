@@ -3,7 +3,8 @@
 #include "Host/PluginLibrary.h"
 #include "Platform/PropertyValue.h"
 #include "Tools/ObservedDevice.h"
-#include "Tools/Streams.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/WakeUp.h"
 
 #include <chrono>
 #include <memory>
@@ -19,11 +20,14 @@ struct OwnStatistics {
 };
 
 /// Runs the service on a device as the daemon does, without a bus: until everything was played, for
-/// a time, or until SIGINT, SIGTERM or SIGHUP; a second signal ends the process. `node` is the
-/// device's name where it has none itself. Throws Failure when the device or the plug-in cannot be
-/// used, when the device is unplugged, and when the service takes no reports.
-OwnStatistics gatherStatistics(const Host::PluginLibrary& library, const std::string& node,
+/// a time, or until a signal asks for the end. `name` is what the device is called where nothing
+/// else names it; `signals` and `wake` belong together. Throws Failure when the device or the
+/// plug-in cannot be used, when the device is unplugged, and when the service takes no reports for
+/// so long.
+OwnStatistics gatherStatistics(const Host::PluginLibrary& library, const std::string& name,
                                const std::shared_ptr<ObservedDevice>& device,
-                               std::optional<std::chrono::nanoseconds> duration, Streams& streams);
+                               std::optional<std::chrono::nanoseconds> duration,
+                               const SignalWatch& signals, const WakeUp& wake,
+                               std::chrono::nanoseconds patience);
 
 }  // namespace VexaTouch::Tools::Daemon

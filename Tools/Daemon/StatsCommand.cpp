@@ -8,6 +8,8 @@
 #include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
 #include "Tools/OptionValues.h"
+#include "Tools/SignalWatch.h"
+#include "Tools/WakeUp.h"
 
 #include <array>
 #include <cstdint>
@@ -98,10 +100,13 @@ int runOwn(const Arguments& arguments, Streams& streams) {
     wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
     wishes.match = matchOption(arguments, choice);
     const auto duration = durationOption(arguments, kDurationOption.name);
+    // Signals are set up before there is any other thread, so that none is bothered by them.
+    const WakeUp wake;
+    const SignalWatch signals(wake);
     const auto device = makeDevice(choice, wishes, streams);
     const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
     const Daemon::OwnStatistics own =
-        Daemon::gatherStatistics(library, text, device, duration, streams);
+        Daemon::gatherStatistics(library, text, device, duration, signals, wake, streams.patience);
     const Daemon::DaemonClient::Device shown{.number = 1, .path = {}, .properties = own.properties};
     if (arguments.given("--json")) {
         const Vexa::PropertyValue::Array all = {jsonEntry(shown, own.statistics)};
