@@ -7,6 +7,7 @@
 #include "Tools/Daemon/PropertyRules.h"
 #include "Tools/EventRecord.h"
 #include "Tools/Failure.h"
+#include "Tools/ForwardingDevice.h"
 #include "Tools/FrameFeed.h"
 
 #include <gmock/gmock.h>
@@ -17,10 +18,13 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <chrono>
 #include <fstream>
 #include <future>
+#include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -325,6 +329,70 @@ TEST_F(DaemonTest, ASurfaceThatComesBackHasItsSettings) {
               "surface 1, /dev/hidraw7, Surface 7: unplugged\n"
               "surface 2, /dev/hidraw9, Surface 9: running\n"
               "surface 3, /dev/hidraw10, Surface 10: running\n");
+}
+
+/// A device whose feature reports are not answered until it is allowed.
+class SlowDevice final : public Tools::ForwardingDevice {
+public:
+    using ForwardingDevice::ForwardingDevice;
+
+    std::promise<void> asked;
+    std::promise<void> allowed;
+
+    vexa_status getReport(vexa_report_type type, std::uint32_t reportId,
+                          std::span<std::uint8_t> report, std::size_t& length) noexcept override {
+        if (!wasAsked_.exchange(true)) {
+            asked.set_value();
+            allowed.get_future().get();
+        }
+        return ForwardingDevice::getReport(type, reportId, report, length);
+    }
+
+private:
+    std::atomic<bool> wasAsked_ = false;
+};
+
+TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    auto surface = playedSurface("7", example("taps"));
+    const auto slow = std::make_shared<SlowDevice>(surface.open());
+    surface.open = [slow] { return slow; };
+    daemon->source.plug(surface);
+    waitForState(1, "running");
+    Tools::Daemon::EventLoop loop;
+    Bus caller(bus->address());
+    const auto failed = [&](const BusError& error) {
+        ADD_FAILURE() << error.what();
+        loop.stop();
+    };
+    BusMessage get = caller.call(BusNames::kService, first, BusNames::kDevice, "Get");
+    get.string("FirmwareVersion");
+    const auto firmware = caller.askLater(get, [](const BusMessage&) {}, failed);
+    BusMessage set = caller.call(BusNames::kService, first, BusNames::kDevice, "Set");
+    set.string(kHoldTimeout).value(300);
+    const auto taken = caller.askLater(set, [&](const BusMessage&) { loop.stop(); }, failed);
+    // Both have been asked for when the one behind them is answered.
+    static_cast<void>(caller.ask(caller.call(BusNames::kService, BusNames::kManagerPath,
+                                             BusNames::kManager, "ListDevices")));
+    slow->asked.get_future().get();
+    daemon->source.unplug("7");
+    while (!client->devices().empty()) {
+    }
+    slow->allowed.set_value();
+    caller.attach(loop, [&] { loop.stop(); });
+    loop.run();
+    // Gone altogether once its end has been counted.
+    const auto isGone = [&] {
+        bool gone = false;
+        daemon->call([&](Tools::Daemon::Daemon& under) { gone = under.instances() == 0; });
+        return gone;
+    };
+    while (!isGone()) {
+    }
+    daemon->source.plug(playedSurface("7", example("taps")));
+    waitForState(2, "running");
+    EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(300U));
 }
 
 TEST_F(DaemonTest, ASurfaceThatCannotBeOpenedSaysWhy) {

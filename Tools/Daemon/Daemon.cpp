@@ -12,6 +12,7 @@ namespace VexaTouch::Tools::Daemon {
 struct Daemon::Device {
     unsigned number = 0;
     bool plugged = true;
+    Settings settings;  // as they were when it was unplugged
     std::unique_ptr<EventListener> listener;
     std::unique_ptr<SurfaceInstance> instance;
     std::unique_ptr<DeviceObject> object;
@@ -119,7 +120,8 @@ void Daemon::takeDown(Device& device) {
     device.plugged = false;
     manager_.announceRemoved(device.object->path());
     device.object->withdraw();
-    remember(device.instance->surface().key(), device.instance->settings());
+    device.settings = device.instance->settings();
+    remember(device.instance->surface().key(), device.settings);
     device.instance->end([this, &device] { taken(device); });
 }
 
@@ -131,6 +133,10 @@ void Daemon::taken(Device& device) {
         log_ << device.title() << ": " << counts.framesLost << " of "
              << counts.images + counts.framesLost << " frames were lost at " << counts.gaps
              << " place(s)" << std::endl;
+    }
+    // What was asked for before the unplug and taken only afterwards is in force as well.
+    if (device.instance->settings() != device.settings) {
+        remember(device.instance->surface().key(), device.instance->settings());
     }
     if (device.listener) {
         device.listener->surfaceGone();
