@@ -191,7 +191,8 @@ protected:
 
 TEST_F(HostileProgramTest, HugeKeysValuesAndMessagesAreRefusedOneByOne) {
     serve(kEndless);
-    constexpr std::size_t kHuge = std::size_t{30} << 20U;
+    // Nearly as much as the bus takes; each takes long where every byte is checked.
+    constexpr std::size_t kHuge = std::size_t{VEXA_SANITIZED == 0 ? 30 : 2} << 20U;
     Bus hostile(bus->address());
     Tools::Daemon::EventLoop loop;
     std::vector<BusSlot> slots;
@@ -206,7 +207,7 @@ TEST_F(HostileProgramTest, HugeKeysValuesAndMessagesAreRefusedOneByOne) {
                 }
             }));
     };
-    for (int i = 0; i < 4; ++i) {
+    for (int i = 0; i < 2; ++i) {
         BusMessage key = call(hostile, "Get");
         key.string(std::string(kHuge, 'k'));
         send(key);
@@ -218,13 +219,12 @@ TEST_F(HostileProgramTest, HugeKeysValuesAndMessagesAreRefusedOneByOne) {
         send(bytes);
         // Four bytes each in the message.
         BusMessage nothing = call(hostile, "Set");
-        nothing.string("Product").value(
-            PropertyValue::Array(std::size_t{1} << 20U, PropertyValue::null()));
+        nothing.string("Product").value(PropertyValue::Array(kHuge / 32, PropertyValue::null()));
         send(nothing);
     }
     hostile.attach(loop, [&] { loop.stop(); });
     loop.run();
-    EXPECT_EQ(answers.size(), 16U);
+    EXPECT_EQ(answers.size(), 8U);
     for (const std::string& answer : answers) {
         EXPECT_THAT(answer, AnyOf(ErrorName::kUnknownKey, ErrorName::kInvalidValue));
     }

@@ -6,6 +6,8 @@
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
+#include <atomic>
 #include <chrono>
 #include <cstdlib>
 #include <future>
@@ -71,6 +73,17 @@ protected:
         };
         daemon->source.plug(std::move(surface));
         auto device = opened->get_future().get();
+        // One that has not begun is not asked yet.
+        Tools::Daemon::DaemonClient client(bus->address());
+        const auto isRunning = [&] {
+            const auto all = client.devices();
+            return std::ranges::any_of(all, [&](const auto& each) {
+                return each.properties.member("Serial") == Vexa::PropertyValue("serial " + id) &&
+                       each.properties.member("State") == Vexa::PropertyValue("running");
+            });
+        };
+        while (!isRunning()) {
+        }
         device->hold();
         return device;
     }
