@@ -63,7 +63,7 @@ protected:
 };
 
 TEST_F(DaemonProgramTest, TellsItsManagerWhatItServesAndThatItLives) {
-    const ServiceManager manager(folder.path("notify"), "20000");
+    ServiceManager manager(folder.path("notify"), "20000");
     ProgramRun daemon(daemonOn("sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture"));
     EXPECT_THAT(manager.heardUntil("WATCHDOG=1"),
                 AllOf(StartsWith("READY=1\n"), HasSubstr("STATUS=1 surface, ")));

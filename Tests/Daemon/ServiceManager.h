@@ -2,15 +2,21 @@
 
 #include "Tools/FileDescriptor.h"
 
+#include <poll.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 
 #include <array>
+#include <atomic>
+#include <condition_variable>
 #include <cstddef>
 #include <cstdlib>
 #include <cstring>
+#include <mutex>
 #include <stdexcept>
 #include <string>
+#include <thread>
+#include <utility>
 
 namespace VexaTouch::Testing {
 
@@ -31,39 +37,55 @@ public:
         if (watchdogMicroseconds != nullptr) {
             setenv("WATCHDOG_USEC", watchdogMicroseconds, 1);
         }
+        reader_ = std::thread([this] { read(); });
     }
     ~ServiceManager() {
+        over_ = true;
+        ::shutdown(socket_.get(), SHUT_RDWR);
+        reader_.join();
         unsetenv("NOTIFY_SOCKET");
         unsetenv("WATCHDOG_USEC");
     }
     ServiceManager(const ServiceManager&) = delete;
     ServiceManager& operator=(const ServiceManager&) = delete;
 
-    /// Reads what it is told until it is told this.
-    std::string heardUntil(const std::string& wanted) const {
-        std::string all;
-        while (all.find(wanted) == std::string::npos) {
-            all += next(0) + '\n';
-        }
-        return all;
+    /// Waits until it is told this; gives all that it was told up to then.
+    std::string heardUntil(const std::string& wanted) {
+        std::unique_lock guard(lock_);
+        more_.wait(guard, [&] { return text_.find(wanted) != std::string::npos; });
+        return std::exchange(text_, {});
     }
-    /// What it was told and has not read yet.
-    std::string heard() const {
-        std::string all;
-        for (std::string text; !(text = next(MSG_DONTWAIT)).empty();) {
-            all += text + '\n';
-        }
-        return all;
+    /// All that it was told and nobody has asked for yet.
+    std::string heard() {
+        const std::lock_guard guard(lock_);
+        take();
+        return std::exchange(text_, {});
     }
 
 private:
-    std::string next(int flags) const {
+    // A socket that is not read holds up who writes after a few lines.
+    void read() {
+        pollfd waiting{.fd = socket_.get(), .events = POLLIN, .revents = 0};
+        while (!over_ && ::poll(&waiting, 1, -1) >= 0) {
+            const std::lock_guard guard(lock_);
+            take();
+            more_.notify_all();
+        }
+    }
+    void take() {
         std::array<char, 512> text{};
-        const ssize_t got = ::recv(socket_.get(), text.data(), text.size(), flags);
-        return {text.data(), got > 0 ? static_cast<std::size_t>(got) : 0};
+        for (ssize_t got = 0;
+             (got = ::recv(socket_.get(), text.data(), text.size(), MSG_DONTWAIT)) > 0;) {
+            text_.append(text.data(), static_cast<std::size_t>(got)).append("\n");
+        }
     }
 
     Tools::FileDescriptor socket_;
+    std::mutex lock_;
+    std::condition_variable more_;
+    std::string text_;
+    std::atomic<bool> over_ = false;
+    std::thread reader_;
 };
 
 }  // namespace VexaTouch::Testing
