@@ -1,9 +1,11 @@
 #include "Tools/Daemon/Daemon.h"
 
+#include "Platform/ScriptedDevice.h"
 #include "Shared/InputReport.h"
 #include "Tests/Daemon/DaemonUnderTest.h"
 #include "Tests/Tools/VexatouchProgram.h"
 #include "Tools/Daemon/BusNames.h"
+#include "Tools/Daemon/LiveDevice.h"
 #include "Tools/Daemon/PropertyRules.h"
 #include "Tools/EventRecord.h"
 #include "Tools/Failure.h"
@@ -26,6 +28,8 @@
 #include <optional>
 #include <span>
 #include <string>
+#include <string_view>
+#include <utility>
 #include <vector>
 
 namespace VexaTouch::Testing {
@@ -393,6 +397,35 @@ TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
     daemon->source.plug(playedSurface("7", example("taps")));
     waitForState(2, "running");
     EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(300U));
+}
+
+TEST_F(DaemonTest, WhatWasSentJustBeforeTheUnplugIsTaken) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    const auto device = std::make_shared<Vexa::ScriptedDevice>();
+    std::promise<void> held;
+    std::promise<void> allowed;
+    device->setHook([&, isFirst = true](std::string_view operation) mutable {
+        if (operation == Vexa::ScriptedDevice::kReportHandled && std::exchange(isFirst, false)) {
+            held.set_value();
+            allowed.get_future().get();
+        }
+    });
+    auto surface = playedSurface("7", example("taps"));
+    surface.open = [device] { return std::make_shared<Tools::Daemon::LiveDevice>(device); };
+    daemon->source.plug(surface);
+    waitForState(1, "running");
+    constexpr std::uint64_t kReports = 60;
+    for (std::uint64_t i = 0; i < kReports; ++i) {
+        ASSERT_TRUE(device->sendReport(std::vector<std::uint8_t>{9}));
+    }
+    held.get_future().get();
+    device->unplug();
+    daemon->source.unplug("7");
+    while (!client->devices().empty()) {
+    }
+    allowed.set_value();
+    EXPECT_TRUE(device->waitUntilHandled(kReports));
 }
 
 TEST_F(DaemonTest, ASurfaceThatCannotBeOpenedSaysWhy) {

@@ -112,17 +112,17 @@ void Daemon::remove(const std::string& id) {
     });
     if (found != devices_.end()) {
         log_ << (*found)->title() << ": unplugged" << std::endl;
-        takeDown(**found);
+        takeDown(**found, true);
     }
 }
 
-void Daemon::takeDown(Device& device) {
+void Daemon::takeDown(Device& device, bool isUnplugged) {
     device.plugged = false;
     manager_.announceRemoved(device.object->path());
     device.object->withdraw();
     device.settings = device.instance->settings();
     remember(device.instance->surface().key(), device.settings);
-    device.instance->end([this, &device] { taken(device); });
+    device.instance->end(isUnplugged, [this, &device] { taken(device); });
 }
 
 void Daemon::taken(Device& device) {
@@ -175,7 +175,7 @@ void Daemon::end(std::function<void()> done) {
     ended_ = std::move(done);
     for (const auto& device : devices_) {
         if (device->plugged) {
-            takeDown(*device);
+            takeDown(*device, false);
         }
     }
 }

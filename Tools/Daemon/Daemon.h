@@ -84,7 +84,7 @@ private:
     void takeChanges();
     void add(PluggedSurface surface);
     void remove(const std::string& id);
-    void takeDown(Device& device);
+    void takeDown(Device& device, bool isUnplugged);
     void taken(Device& device);
     void stateChanged(Device& device);
     void remember(const std::string& key, Settings settings);

@@ -72,8 +72,10 @@ private:
                 }
             });
         if (const int hangUp = device_->hangUpDescriptor(); hangUp >= 0) {
-            hangUpWatch_ =
-                loop_.watch(hangUp, 0, [this](std::uint32_t) { fail("the device was unplugged"); });
+            hangUpWatch_ = loop_.watch(hangUp, 0, [this](std::uint32_t) {
+                isUnplugged_ = true;
+                fail("the device was unplugged");
+            });
         }
         if (finishWanted_) {
             finish();
@@ -103,7 +105,7 @@ private:
         deadline_.reset();
         lookWatch_.reset();
         hangUpWatch_.reset();
-        instance_->end([this] { loop_.stop(); });
+        instance_->end(isUnplugged_, [this] { loop_.stop(); });
     }
 
     std::shared_ptr<ObservedDevice> device_;
@@ -111,6 +113,7 @@ private:
     ReportWatch reportWatch_;
     bool finishWanted_ = false;
     bool isEnding_ = false;
+    bool isUnplugged_ = false;
     std::string failure_;
     Vexa::PropertyValue eventStats_;
     EventLoop loop_;

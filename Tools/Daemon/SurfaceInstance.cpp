@@ -2,11 +2,14 @@
 
 #include "Platform/HostClock.h"
 #include "Shared/Util.h"
+#include "Tools/ObservedDevice.h"
 #include "Tools/SettingKeys.h"
 
 #include <algorithm>
+#include <chrono>
 #include <exception>
 #include <string_view>
+#include <thread>
 #include <utility>
 
 namespace VexaTouch::Tools::Daemon {
@@ -25,6 +28,18 @@ bool isSetting(const std::string& key) {
 
 BusError notTaken(const std::string& key) {
     return {ErrorName::kFailed, key + ": the device did not take the value"};
+}
+
+/// Returns when the service has read an unplugged device to its end, or when it does not get there
+/// in time: the kernel keeps what was sent, and closing the device would throw it away.
+void waitForLastReports(const Host::HostSession& session) {
+    constexpr auto kPatience = std::chrono::seconds(5);
+    constexpr auto kInterval = std::chrono::milliseconds(1);
+    const auto until = std::chrono::steady_clock::now() + kPatience;
+    while (session.property(ObservedDevice::kReadsOnKey) &&
+           std::chrono::steady_clock::now() < until) {
+        std::this_thread::sleep_for(kInterval);
+    }
 }
 
 }  // namespace
@@ -108,11 +123,14 @@ SurfaceInstance::~SurfaceInstance() {
     parts_.reset();
 }
 
-void SurfaceInstance::end(std::function<void()> done) {
+void SurfaceInstance::end(bool isUnplugged, std::function<void()> done) {
     setState(State::Ending, reason_);
-    worker_.submit([this, done = std::move(done)]() mutable noexcept {
+    worker_.submit([this, isUnplugged, done = std::move(done)]() mutable noexcept {
         try {
             if (parts_->session) {
+                if (isUnplugged) {
+                    waitForLastReports(*parts_->session);
+                }
                 parts_->session->end();
             }
         } catch (const std::exception&) {

@@ -82,9 +82,10 @@ public:
     SurfaceInstance& operator=(const SurfaceInstance&) = delete;
     SurfaceInstance& operator=(SurfaceInstance&&) = delete;
 
-    /// Takes everything back in order: device closed, unscheduled, stopped, released. Calls back
-    /// last of all; no other callback comes afterwards. Once.
-    void end(std::function<void()> done);
+    /// Takes everything back in order: device closed, unscheduled, stopped, released. What one that
+    /// is unplugged had sent before is taken first. Calls back last of all; no other callback comes
+    /// afterwards. Once.
+    void end(bool isUnplugged, std::function<void()> done);
 
     [[nodiscard]] State state() const noexcept { return state_; }
     /// "starting", "running", "failed", "ending".

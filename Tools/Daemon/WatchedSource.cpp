@@ -1,6 +1,7 @@
 #include "Tools/Daemon/WatchedSource.h"
 
 #include "Platform/HidrawDevice.h"
+#include "Tools/Daemon/LiveDevice.h"
 
 #include <memory>
 #include <utility>
@@ -18,7 +19,7 @@ PluggedSurface pluggedSurface(const Host::Surface& found) {
     surface.vendor = found.vendor;
     surface.product = found.product;
     surface.open = [node = found.node, sysPath = found.sysPath] {
-        return std::make_shared<Vexa::HidrawDevice>(node, sysPath);
+        return std::make_shared<LiveDevice>(std::make_shared<Vexa::HidrawDevice>(node, sysPath));
     };
     return surface;
 }
