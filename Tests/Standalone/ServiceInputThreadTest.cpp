@@ -168,15 +168,25 @@ TEST(ServiceInputThreadTest, CallsAreOneWaitAndOneReadForEachReportAndAWakeForAB
     EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
 
     ASSERT_EQ(calls.size(), 2U);
-    if (VEXA_SANITIZED) {
-        // It has memory and locks of its own.
-        for (Calls& span : calls) {
-            for (const std::uint64_t call : std::to_array<std::uint64_t>(
-                     {SYS_mmap, SYS_munmap, SYS_madvise, SYS_mprotect, SYS_brk, SYS_sched_yield})) {
-                span.erase(call);
-            }
+    for (Calls& span : calls) {
+        // Once in a thousand reports or so the heap asks for more, where its pieces lie badly.
+        int growths = 0;
+        for (const std::uint64_t call :
+             std::to_array<std::uint64_t>({SYS_mmap, SYS_munmap, SYS_mprotect, SYS_brk})) {
+            const auto found = span.find(call);
+            if (found == span.end()) continue;
+            growths += found->second;
+            span.erase(found);
         }
-        for (Calls& span : calls) span.erase(SYS_futex);
+        if (!VEXA_SANITIZED) {
+            EXPECT_LE(growths, kReports / 100);
+            continue;
+        }
+        // It has memory and locks of its own.
+        for (const std::uint64_t call :
+             std::to_array<std::uint64_t>({SYS_madvise, SYS_sched_yield, SYS_futex})) {
+            span.erase(call);
+        }
     }
     const int reports = kReports + 1;  // the mark's own report too
 #ifdef SYS_epoll_wait
