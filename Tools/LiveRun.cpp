@@ -2,6 +2,7 @@
 
 #include "Host/RegisteredDevice.h"
 #include "Platform/HostClock.h"
+#include "Platform/Log.h"
 #include "Platform/PropertyValue.h"
 #include "Platform/SignalsBlocked.h"
 #include "Shared/Util.h"
@@ -110,6 +111,8 @@ LiveRun::~LiveRun() = default;
 void LiveRun::installHooks() {
     DeviceHooks hooks;
     hooks.onStateFrame = [this](const std::string& key, const Vexa::PropertyValue& value) {
+        // Closing the device waits for its player.
+        const Vexa::LogWithoutBlocking logWithoutBlocking;
         session_.setProperty(std::string(kPipelineDomain) + key, value);
         if (surface_) {
             surface_->state(key, value);
@@ -180,6 +183,8 @@ void LiveRun::runToEnd() {
 }
 
 void LiveRun::keep() {
+    // The service logs while it is halted.
+    const Vexa::LogWithoutBlocking logWithoutBlocking;
     while (!isOver()) {
         waitForEnd();
         lookAfterReports();
@@ -283,7 +288,9 @@ void LiveRun::takeEvents() {
         totals_.latencyMostNs = std::max(totals_.latencyMostNs, event.latencyNs);
         print(event);
     }
-    totals_.lost += taken.lost;
+    if (!options_.count || totals_.events < *options_.count) {
+        totals_.lost += taken.lost;
+    }
 }
 
 void LiveRun::print(const DeliveredEvent& event) {
@@ -376,6 +383,9 @@ void LiveRun::printSummary(const std::string& gaps) const {
                                        static_cast<double>(totals_.events))
                        << " on average, "
                        << microseconds(static_cast<double>(totals_.latencyMostNs)) << " at most";
+    }
+    if (totals_.lost > 0) {
+        streams_.error << "; " << counted(totals_.lost, "event") << " lost";
     }
     streams_.error << gaps << '\n';
 }

@@ -1,6 +1,5 @@
 #include "Tools/Replay.h"
 
-#include <algorithm>
 #include <utility>
 
 namespace VexaTouch::Tools {
@@ -26,6 +25,9 @@ Replay::Replay(FrameList frames, ReplaySettings settings, Vexa::HostClock& clock
     installProbes();
     recording_.playReset();
     giveSettings(false);
+    for (const Setting& setting : settings_.list) {
+        inForce_.push_back(recording_.getState(setting.key));
+    }
 }
 
 void Replay::giveSettings(bool again) {
@@ -38,12 +40,16 @@ void Replay::giveSettings(bool again) {
     }
 }
 
-void Replay::lookAtState(const PipelineRecording::Frame& frame) {
+void Replay::lookAtState() {
     if (settings_.pinned) {
         giveSettings(true);
-    } else if (!lost_ && std::ranges::find(settings_.list, frame.key, &Setting::key) !=
-                             settings_.list.end()) {
-        lost_ = {.key = frame.key, .index = counts_.frames};
+        return;
+    }
+    for (std::size_t i = 0; !lost_ && i < settings_.list.size(); ++i) {
+        const std::string& key = settings_.list[i].key;
+        if (recording_.getState(key) != inForce_[i]) {
+            lost_ = {.key = key, .index = counts_.frames};
+        }
     }
 }
 
@@ -74,7 +80,7 @@ const PlayedFrame& Replay::next(float speed) {
     played_.type = PlayedType::State;
     recording_.playNextFrame(speed);
     if (upcoming_->type == PipelineRecording::Frame::Type::State) {
-        lookAtState(*upcoming_);
+        lookAtState();
     }
     played_.index = counts_.frames;
     played_.frame = &*upcoming_;

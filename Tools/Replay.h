@@ -51,7 +51,7 @@ struct ReplaySettings {
     bool pinned = false;
 };
 
-/// A setting that was given and then changed by the recording.
+/// A setting that was given and then changed to another value by the recording.
 struct LostSetting {
     std::string key;          ///< as a pipeline takes it
     std::uint64_t index = 0;  ///< of the state frame
@@ -86,9 +86,10 @@ public:
 private:
     void installProbes();
     void giveSettings(bool again);
-    void lookAtState(const PipelineRecording::Frame& frame);
+    void lookAtState();
 
     ReplaySettings settings_;
+    std::vector<Vexa::PropertyValue> inForce_;  ///< each setting as it reads back, once given
     std::optional<LostSetting> lost_;
     PipelineRecording recording_;
     FrameList::Iterator upcoming_;

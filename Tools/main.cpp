@@ -11,17 +11,17 @@
 namespace {
 
 /// What is opened next must not become a standard stream that the caller has closed: messages would
-/// be written into a result. False when /dev/null cannot be had.
+/// be written into a result. What stands there instead is open the wrong way round, so that whoever
+/// uses it learns that it is closed. False when it cannot be had.
 bool keepStandardStreams() {
-    for (;;) {
-        const int descriptor = open("/dev/null", O_RDWR);
-        if (descriptor < 0) {
+    for (const int number : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) {
+        const bool isClosed = fcntl(number, F_GETFD) < 0;
+        const int wrongWay = number == STDIN_FILENO ? O_WRONLY : O_RDONLY;
+        if (isClosed && open("/dev/null", wrongWay) != number) {
             return false;
         }
-        if (descriptor > STDERR_FILENO) {
-            return close(descriptor) == 0;
-        }
     }
+    return true;
 }
 
 }  // namespace

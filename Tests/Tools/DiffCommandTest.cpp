@@ -7,6 +7,7 @@ namespace VexaTouch::Testing {
 namespace {
 
 using ::testing::HasSubstr;
+using ::testing::Not;
 using ::testing::StartsWith;
 
 class DiffCommandTest : public ::testing::Test {
@@ -28,13 +29,6 @@ TEST_F(DiffCommandTest, TheSameRecordingIsTheSame) {
                              R"("first":null,"counts":{}})"
                              "\n",
                              "0 of 125 frames differ\n"}));
-}
-
-/// The session sets the timeout itself, near its end.
-std::string lost(const std::string& option) {
-    return "vexatouch diff: " + option +
-           " Algs.HoldTimeoutMilliseconds held until frame 98 only, in which the recording sets "
-           "it; with --pin it holds to the end\n";
 }
 
 TEST_F(DiffCommandTest, AnotherSettingShowsTheFirstFrameAndACountPerField) {
@@ -62,7 +56,7 @@ TEST_F(DiffCommandTest, AnotherSettingShowsTheFirstFrameAndACountPerField) {
         "  stats.numQuarnCallIncrement  66\n"
         "  events                       2\n";
     EXPECT_EQ(diff({session, "--set-b", "HoldTimeoutMilliseconds=300"}),
-              (CommandResult{1, expected, "67 of 125 frames differ\n" + lost("--set-b")}));
+              (CommandResult{1, expected, "67 of 125 frames differ\n"}));
     EXPECT_EQ(diff({session, "--set-a", "HoldTimeoutMilliseconds=500", "--set-b",
                     "Pipeline.Algs.HoldTimeoutMilliseconds=300"})
                   .out,
@@ -84,13 +78,24 @@ TEST_F(DiffCommandTest, JsonHoldsTheSame) {
             R"("lastDispatchedPhase":20,"stats.numBeginHold":20,"stats.numIncrementHold":66,)"
             R"("stats.numQuarnCall":20,"stats.numQuarnCallIncrement":66,"events":2}})"
             "\n",
-            "67 of 125 frames differ\n" + lost("--set-a")}));
+            "67 of 125 frames differ\n"}));
 }
 
-TEST_F(DiffCommandTest, APinnedSettingHoldsToTheEnd) {
-    const CommandResult result = diff({session, "--pin", "--set-b", "HoldTimeoutMilliseconds=300"});
-    EXPECT_EQ(result.exitCode, 1);
-    EXPECT_EQ(result.error, "67 of 125 frames differ\n");
+TEST_F(DiffCommandTest, ASettingThatTheRecordingSetsItselfHoldsWhenItIsPinned) {
+    RecordedSession recorded;
+    recorded.set("Algs.HoldTimeoutMilliseconds", 500)
+        .feel(nothing().forMs(20))
+        .feel(touch("A").at(350).with("B", 150).forMs(900))
+        .feel(nothing().forMs(500));
+    const std::string file = folder.file("set.json", recorded.text());
+    EXPECT_EQ(
+        diff({file, "--set-b", "HoldTimeoutMilliseconds=300"}).error,
+        "0 of 143 frames differ\nvexatouch diff: --set-b Algs.HoldTimeoutMilliseconds held "
+        "until frame 0 only, in which the recording sets it; with --pin it holds to the end\n");
+    const CommandResult pinned = diff({file, "--pin", "--set-b", "HoldTimeoutMilliseconds=300"});
+    EXPECT_EQ(pinned.exitCode, 1);
+    EXPECT_THAT(pinned.out, HasSubstr("hold-start"));
+    EXPECT_THAT(pinned.error, Not(HasSubstr("held until")));
 }
 
 TEST_F(DiffCommandTest, ManyFieldsOfTheFirstFrameAreCutShort) {

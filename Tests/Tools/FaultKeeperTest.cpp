@@ -4,7 +4,9 @@
 
 #include <cerrno>
 #include <fstream>
+#include <ostream>
 #include <sstream>
+#include <streambuf>
 #include <string>
 
 namespace VexaTouch::Tools {
@@ -22,16 +24,36 @@ TEST(FaultKeeperTest, LetsEverythingThrough) {
     EXPECT_EQ(text.str(), "one 2333\nfour");
 }
 
-TEST(FaultKeeperTest, KeepsWhyTheFirstWriteFailed) {
-    std::ofstream full("/dev/full");
-    {
-        FaultKeeper fault(full);
-        full << "text" << std::flush;
-        errno = EPERM;
-        full << "more" << std::flush;
-        EXPECT_EQ(fault.error(), ENOSPC);
+/// Every write fails, for the reason that it has now.
+class Failing final : public std::streambuf {
+public:
+    int reason = 0;
+
+protected:
+    std::streamsize xsputn(const char* /*text*/, std::streamsize /*length*/) override {
+        errno = reason;
+        return 0;
     }
-    EXPECT_FALSE(full.good());
+};
+
+TEST(FaultKeeperTest, KeepsWhyTheFirstWriteFailed) {
+    Failing buffer;
+    std::ostream stream(&buffer);
+    const FaultKeeper fault(stream);
+    buffer.reason = ENOSPC;
+    stream << "text";
+    EXPECT_FALSE(stream.good());
+    stream.clear();
+    buffer.reason = EPERM;
+    stream << "more";
+    EXPECT_EQ(fault.error(), ENOSPC);
+}
+
+TEST(FaultKeeperTest, KnowsWhyAFileIsNotWritten) {
+    std::ofstream full("/dev/full");
+    const FaultKeeper fault(full);
+    full << "text" << std::flush;
+    EXPECT_EQ(fault.error(), ENOSPC);
 }
 
 TEST(FaultKeeperTest, LeavesAFailedStreamFailed) {

@@ -166,6 +166,16 @@ TEST_F(ReplayCommandTest, ResultsAreWholeWhenTheStandardErrorIsClosed) {
     EXPECT_EQ(contentOf(closed), contentOf(quiet));
 }
 
+TEST_F(ReplayCommandTest, AClosedStandardOutputIsAFailure) {
+    const std::string errors = folder.path("errors");
+    const std::string program = vexatouchProgram();
+    const int status =
+        std::system((program + " replay '" + session + "' >&- 2>'" + errors + "'").c_str());
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1) << status;
+    EXPECT_THAT(contentOf(errors),
+                HasSubstr("vexatouch replay: cannot write the results: Bad file descriptor\n"));
+}
+
 TEST_F(ReplayCommandTest, AWrongSettingIsFoundBeforeTheFileIsOpened) {
     EXPECT_EQ(replay({folder.path("nowhere.json"), "--set", "X=1"}).exitCode, 2);
 }

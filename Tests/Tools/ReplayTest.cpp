@@ -117,6 +117,23 @@ TEST(ReplayTest, ASettingThatTheRecordingChangesIsLostAndToldOf) {
     EXPECT_EQ(replay.lostSetting(), (LostSetting{.key = "Algs.ActivationThreshold", .index = 1}));
 }
 
+TEST(ReplayTest, ASettingThatTheRecordingSetsToTheSameIsNotLost) {
+    Replay replay(sessionWithSettings().frames(), {.list = {{"Algs.ActivationThreshold", 100}}});
+    while (replay.canContinue()) {
+        replay.next();
+    }
+    EXPECT_EQ(replay.lostSetting(), std::nullopt);
+}
+
+TEST(ReplayTest, ASettingIsLostWhateverTheSpellingOfItsIndex) {
+    RecordedSession recorded;
+    recorded.set("Algs.VirtualNormalizationFactors.1", 3).feel(nothing());
+    Replay replay(recorded.frames(), {.list = {{"Algs.VirtualNormalizationFactors.01", 2.0}}});
+    replay.next();
+    EXPECT_EQ(replay.lostSetting(),
+              (LostSetting{.key = "Algs.VirtualNormalizationFactors.01", .index = 0}));
+}
+
 TEST(ReplayTest, APinnedSettingHoldsWhateverTheRecordingSets) {
     Replay replay(sessionWithSettings().frames(),
                   {.list = {{"Algs.ActivationThreshold", 50.0}}, .pinned = true});
