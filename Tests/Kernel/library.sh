@@ -16,14 +16,15 @@ fail() {
     exit 1
 }
 
-# wait_until WHAT COMMAND...: for at most 20 s. Each look costs the machine a millisecond or two, so wait
-# for lines of a pipe where there is one.
+seconds_up() { cut -d . -f 1 /proc/uptime; }
+
+# wait_until WHAT COMMAND...: for at most 20 s. Each look costs the machine a millisecond or two, one that
+# starts a program of ours tens of them, so wait for lines of a pipe where there is one.
 wait_until() {
-    local what=$1 left=1000
+    local what=$1 end=$(($(seconds_up) + 20))
     shift
     until "$@"; do
-        left=$((left - 1))
-        [ "$left" -gt 0 ] || fail "waited in vain: $what"
+        [ "$(seconds_up)" -le "$end" ] || fail "waited in vain: $what"
         usleep 20000
     done
 }

@@ -9,6 +9,37 @@ import subprocess
 from .failure import Failure
 
 
+def _record(out, inode, name, mode, content, owner=(0, 0), node=(0, 0)):
+    fields = [inode, mode, *owner, 1, 0, len(content), 0, 0, *node, len(name.encode()) + 1, 0]
+    header = "070701" + "".join(f"{field:08x}" for field in fields)
+    for part in (header.encode() + name.encode() + b"\0", content):
+        out.write(part + bytes(-len(part) % 4))
+
+
+def _trailer(out):
+    _record(out, 0, "TRAILER!!!", 0, b"")
+
+
+def write_system(target, root):
+    """Archives a whole system as it lies in a folder, with its owners and rights."""
+    with open(target, "wb") as out:
+        found = ["."]
+        for place, folders, names in os.walk(root):
+            found += [os.path.relpath(os.path.join(place, name), root) for name in folders + names]
+        for inode, name in enumerate(found, start=1):
+            path = os.path.join(root, name)
+            status = os.lstat(path)
+            content = b""
+            if stat.S_ISLNK(status.st_mode):
+                content = os.readlink(path).encode()
+            elif stat.S_ISREG(status.st_mode):
+                content = pathlib.Path(path).read_bytes()
+            device = (os.major(status.st_rdev), os.minor(status.st_rdev))
+            owner = (status.st_uid, status.st_gid)
+            _record(out, inode, name, status.st_mode, content, owner, device)
+        _trailer(out)
+
+
 class Initramfs:
     """Collects files by their path in the machine, then writes the archive."""
 
@@ -63,15 +94,8 @@ class Initramfs:
         entries.update(self._entries)
         with open(target, "wb") as out:
             for inode, name in enumerate(entries, start=1):
-                self._record(out, inode, name, *entries[name])
-            self._record(out, 0, "TRAILER!!!", 0, b"")
-
-    @staticmethod
-    def _record(out, inode, name, mode, content):
-        fields = [inode, mode, 0, 0, 1, 0, len(content), 0, 0, 0, 0, len(name.encode()) + 1, 0]
-        header = "070701" + "".join(f"{field:08x}" for field in fields)
-        for part in (header.encode() + name.encode() + b"\0", content):
-            out.write(part + bytes(-len(part) % 4))
+                _record(out, inode, name, *entries[name])
+            _trailer(out)
 
     @classmethod
     def _key(cls, path):

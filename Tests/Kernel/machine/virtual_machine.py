@@ -12,7 +12,7 @@ ALL_PASSED = 2 * 0x2A + 1
 SOME_FAILED = 2 * 0x2B + 1
 
 _COMMON = (
-    "-M pc -cpu max -smp 1 -m 512 -nodefaults -no-user-config -display none -no-reboot "
+    "-M pc -cpu max -smp 1 -nodefaults -no-user-config -display none -no-reboot "
     "-device isa-debug-exit,iobase=0xf4 -serial stdio"
 ).split()
 # Time as it goes, or as the machine's own instructions count it: the same on a busy host, and
@@ -34,13 +34,15 @@ class Result:
 class VirtualMachine:
     """One boot. `on_result` gets each result as it comes, then the lines that the check wrote."""
 
-    def __init__(self, program, kernel, initramfs, clock, on_result):
+    def __init__(self, program, kernel, initramfs, clock, on_result, memory=512, arguments=""):
+        """`memory`: in MiB; `arguments`: more for the kernel's command line."""
         self.console = []  # all lines, the results too
         self._on_result = on_result
         self._files = initramfs.with_suffix(".files")
-        self._command = [program, *_COMMON, *ACCELERATORS[clock]]
+        self._command = [program, *_COMMON, "-m", str(memory), *ACCELERATORS[clock]]
         self._command += ["-serial", f"file:{self._files}"]
-        self._command += ["-kernel", str(kernel), "-initrd", str(initramfs), "-append", _KERNEL]
+        self._command += ["-kernel", str(kernel), "-initrd", str(initramfs), "-append"]
+        self._command.append(f"{_KERNEL} {arguments}".rstrip())
 
     @property
     def files(self):
