@@ -66,8 +66,10 @@ bool Journal::isStandardError() const noexcept {
 }
 
 bool Journal::send(const LogMessage& message) const {
+    // A text of ours may end in empty lines, the field's must not.
+    const std::size_t length = message.text.find_last_not_of('\n') + 1;
     const std::array fields = {
-        "MESSAGE=" + message.text,
+        "MESSAGE=" + message.text.substr(0, length),
         "PRIORITY=" + std::string(priorityOf(message.level)),
         "SYSLOG_IDENTIFIER=" + std::string(program_invocation_short_name),
         "VEXATOUCH_CATEGORY=" +

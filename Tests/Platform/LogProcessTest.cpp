@@ -181,14 +181,14 @@ TEST_F(LogProcessTest, TheJournalGetsMessagesWithTheirFields) {
     environment["VEXATOUCH_LOG"] = "debug";
     giveJournalStream();
     giveJournalLibrary();
-    EXPECT_EQ(run({"write", "Algs", "debug", "two\nlines\n"}), 0);
+    EXPECT_EQ(run({"write", "Algs", "debug", "two\nlines\n\n"}), 0);
     EXPECT_EQ(run({"write", "Pipeline", "info", "i"}), 0);
     EXPECT_EQ(run({"write", "HIDService", "error", "e"}), 0);
     EXPECT_EQ(contentOf(error), "");
     const std::string fields =
         std::regex_replace(contentOf(journal), std::regex("[0-9]+ TID=[0-9]+"), "TID");
     EXPECT_EQ(fields,
-              "18 MESSAGE=two\nlines\n\n10 PRIORITY=7\n28 SYSLOG_IDENTIFIER=LogProgram\n"
+              "17 MESSAGE=two\nlines\n10 PRIORITY=7\n28 SYSLOG_IDENTIFIER=LogProgram\n"
               "23 VEXATOUCH_CATEGORY=Algs\nTID\n\n"
               "9 MESSAGE=i\n10 PRIORITY=6\n28 SYSLOG_IDENTIFIER=LogProgram\n"
               "27 VEXATOUCH_CATEGORY=Pipeline\nTID\n\n"
