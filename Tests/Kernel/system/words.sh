@@ -15,7 +15,7 @@ ended() {
     [ "$1" -eq 0 ] || [ "$1" -eq 77 ] || {
         tail -n 8 -v ./*.log status faults keys 2>/dev/null || true
         systemctl status --no-pager --full --lines=60 "$unit" || true
-        vexatouch stats --json || true
+        vexatouch stats || true
     }
     kill $(jobs -p) 2>/dev/null || true
 }
