@@ -13,10 +13,17 @@
 #
 # A system is made once for each set of packages and kept in build/clean-root, as are packages that are
 # downloaded, so a second run needs no network. Remove the folder to have newer packages.
-# Variables: DEBIAN_MIRROR (http://deb.debian.org/debian)
+# Variables: DEBIAN_MIRROR (that of this machine)
 
 clean_root_suite=bookworm
 clean_root_store=${clean_root_store:-$PWD/build/clean-root}
+
+# The mirror that this machine has Debian from.
+clean_root_mirror() {
+    # shellcheck disable=SC2016
+    apt-get indextargets --format '$(REPO_URI)' "Codename: $clean_root_suite" 2>/dev/null |
+        grep -E '^https?://' | grep -v -- -security | head -n 1
+}
 
 clean_root_possible() {
     if [ "$(id -u)" -ne 0 ]; then
@@ -105,9 +112,10 @@ clean_root_made() {
     local kept work base=$clean_root_store/$clean_root_suite.tar
     mkdir -p "$clean_root_store"
     if [ ! -f "$base" ]; then
+        local mirror=${DEBIAN_MIRROR:-$(clean_root_mirror || true)}
         # The lists of packages stay, so that apt there knows what can be had.
         mmdebstrap --quiet --format=tar --variant=minbase --skip=cleanup/apt/lists \
-            "$clean_root_suite" "$base.new" ${DEBIAN_MIRROR:+"$DEBIAN_MIRROR"} >&2 || return 1
+            "$clean_root_suite" "$base.new" ${mirror:+"$mirror"} >&2 || return 1
         mv "$base.new" "$base"
     fi
     kept=$base
