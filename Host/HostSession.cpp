@@ -5,6 +5,7 @@
 
 #include <pthread.h>
 #include <sched.h>
+#include <vexa/log.h>
 
 #include <new>
 #include <stdexcept>
@@ -44,7 +45,11 @@ HostSession::HostSession(const PluginLibrary& library, std::uint32_t service, Ev
       queue_(eventsQueue(file_)),
       plugin_(library),
       service_(plugin_.service()) {
-    queue_.submit([] { askForRealTime(); });
+    queue_.submit([] {
+        askForRealTime();
+        // Nor shall an event wait for who reads the log slowly, as long as the thread lives.
+        vexa_log_set_thread_must_not_block(true);
+    });
     if (const vexa_status status = plugin_.probe(properties, service, score_);
         status != VEXA_STATUS_SUCCESS) {
         fail("Probe", status);

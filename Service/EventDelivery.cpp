@@ -25,8 +25,6 @@ void EventDelivery::operator()(const std::vector<Vexa::HidEvent>& events) const 
 }
 
 void EventDelivery::land(const std::vector<Vexa::HidEvent>& events) const noexcept {
-    // An event must not wait for who reads the log slowly.
-    const Vexa::LogWithoutBlocking logWithoutBlocking;
     Vexa::trace(Vexa::TraceCode::Batch, events.size());
     logFormat(log_, Vexa::LogLevel::Debug, "Dispatch %ju event(s) land",
               static_cast<std::uintmax_t>(events.size()));
