@@ -88,15 +88,15 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     while (takeFrames()) {
     }
     keeper_->eraseProgress();
-    stream.finish();
+    if (!unplugged_ && !stuck_) {
+        stream.finish();
+        session_.end();
+        return keeper_->summary();
+    }
+    const Failure failure =
+        stream.finishAfter(unplugged_ ? "the device was unplugged" : ReportWatch::kFault);
     session_.end();
-    if (unplugged_) {
-        throw Failure("the device was unplugged");
-    }
-    if (stuck_) {
-        throw Failure(ReportWatch::kFault);
-    }
-    return keeper_->summary();
+    throw failure;
 }
 
 bool RecordRun::isOver() {

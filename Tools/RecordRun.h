@@ -59,7 +59,7 @@ public:
 
     /// Runs to the end, the whole teardown included, and finishes the stream. Once. Throws
     /// HostFailure and Failure, also when the device was unplugged; the stream is finished then as
-    /// far as it can be.
+    /// far as it can be, unless there was no report.
     RecordSummary run(RecordingStream& stream);
     /// What went into the stream, also when run() threw.
     [[nodiscard]] RecordSummary summary() const noexcept {

@@ -1,7 +1,6 @@
 #include "Tools/RecordingStream.h"
 
 #include "Platform/PropertyValue.h"
-#include "Tools/Failure.h"
 
 #include <string_view>
 #include <system_error>
@@ -39,6 +38,9 @@ void RecordingStream::add(const RecordedFrame& frame) {
     const std::size_t before = text_.size();
     writer_.write(frame);
     if (text_.size() > before) {
+        if (!firstReport_ && frame.type == RecordedFrame::Type::InputReport) {
+            firstReport_ = frames_ + ends_.size();
+        }
         ends_.push_back(text_.size());
     }
 }
@@ -46,7 +48,9 @@ void RecordingStream::add(const RecordedFrame& frame) {
 void RecordingStream::flush() {
     if (!ends_.empty()) {
         write(target_->isRewritable());
-        keepTarget();
+        if (holdsReport()) {
+            keepTarget();
+        }
     }
     syncIfDue();
 }
@@ -64,6 +68,22 @@ void RecordingStream::finish() {
         fail(error);
     }
     isFinished_ = true;
+}
+
+Failure RecordingStream::finishAfter(const std::string& fault) {
+    if (!ends_.empty()) {
+        write(target_->isRewritable());
+    }
+    if (holdsReport() || !target_->isRewritable()) {
+        finish();
+        return Failure(fault);
+    }
+    isDead_ = true;
+    return Failure(fault + "; no report was recorded, " + name_ + " is as it was");
+}
+
+bool RecordingStream::holdsReport() const noexcept {
+    return firstReport_ && frames_ > *firstReport_;
 }
 
 std::optional<RecordingStream::Clock::time_point> RecordingStream::syncDue() const noexcept {
@@ -91,7 +111,7 @@ void RecordingStream::write(bool withClosing) {
     if (result.error != 0) {
         isDead_ = true;
         saveWhatFits(result.written);
-        if (frames_ > 0) {
+        if (holdsReport()) {
             keepTarget();
         }
         fail(result.error);
@@ -108,6 +128,7 @@ void RecordingStream::keepTarget() {
         isDead_ = true;
         fail(error);
     }
+    isKept_ = true;
 }
 
 // Cuts the file behind the last frame that was written whole and has room for the brackets. Where
@@ -153,9 +174,12 @@ void RecordingStream::syncIfDue() {
 }
 
 void RecordingStream::fail(int error) const {
-    throw Failure(name_ + ": cannot write: " + std::generic_category().message(error) + "; " +
-                  std::to_string(frames_) + (frames_ == 1 ? " frame is" : " frames are") +
-                  " safe in it");
+    const std::string fault = name_ + ": cannot write: " + std::generic_category().message(error);
+    if (target_->isRewritable() && !isKept_) {
+        throw Failure(fault + "; no report had room, it is as it was");
+    }
+    throw Failure(fault + "; " + std::to_string(frames_) +
+                  (frames_ == 1 ? " frame is" : " frames are") + " safe in it");
 }
 
 }  // namespace VexaTouch::Tools

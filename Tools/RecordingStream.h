@@ -3,6 +3,7 @@
 #include "Pipeline/ContainerWriter.h"
 #include "Pipeline/RecordedFrame.h"
 #include "Tools/AppendTarget.h"
+#include "Tools/Failure.h"
 
 #include <chrono>
 #include <cstddef>
@@ -25,8 +26,8 @@ namespace VexaTouch::Tools {
 /// pipe) gets its closing brackets at the end.
 ///
 /// When the disk is full, or a write fails otherwise, the file is brought back to the last frame
-/// that has room together with the brackets. A file that gets no frame at all leaves what was there
-/// before, unless it is finished. One thread.
+/// that has room together with the brackets. A file that gets no report leaves what was there before:
+/// settings alone are not worth an old recording. Only finish() keeps it all the same. One thread.
 class RecordingStream {
 public:
     using Clock = std::chrono::steady_clock;
@@ -36,7 +37,7 @@ public:
     /// Writes the beginning. Throws Failure.
     RecordingStream(std::unique_ptr<AppendTarget> target, std::string name,
                     std::optional<std::chrono::nanoseconds> syncEvery = std::nullopt);
-    /// What was written stays as it is, if there are frames.
+    /// What was written stays as it is, if there is a report among it.
     ~RecordingStream();
     RecordingStream(const RecordingStream&) = delete;
     RecordingStream(RecordingStream&&) = delete;
@@ -53,6 +54,10 @@ public:
     [[nodiscard]] std::optional<Clock::time_point> syncDue() const noexcept;
     /// Flushes and closes; the file is safe from the machine's end then. Once. Throws Failure.
     void finish();
+    /// Ends the recording of a source that failed: finishes it if there is a report, or if what was
+    /// written cannot be taken back; otherwise leaves everything as it was before. Gives what is to
+    /// be thrown for it: the fault, and that nothing was kept where that is so. Throws Failure.
+    [[nodiscard]] Failure finishAfter(const std::string& fault);
 
     /// Frames that are written.
     [[nodiscard]] std::uint64_t frames() const noexcept { return frames_; }
@@ -65,6 +70,7 @@ private:
     [[nodiscard]] std::string_view closing() const noexcept;
     [[nodiscard]] std::uint64_t closingBytes() const noexcept;
     void write(bool withClosing);
+    [[nodiscard]] bool holdsReport() const noexcept;
     void keepTarget();
     void saveWhatFits(std::size_t written) noexcept;
     void syncIfDue();
@@ -78,7 +84,9 @@ private:
     std::vector<std::size_t> ends_;  // of the frames in text_
     std::uint64_t end_ = 0;          // of the last frame in the file
     std::uint64_t frames_ = 0;       // in the file
+    std::optional<std::uint64_t> firstReport_;  // its place among the frames, from 0
     bool isDead_ = false;
+    bool isKept_ = false;
     bool isFinished_ = false;
     bool isNew_ = false;  // something was written since the last sync
     Clock::time_point nextSync_;

@@ -9,6 +9,7 @@
 #include <sys/wait.h>
 
 #include <algorithm>
+#include <chrono>
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
@@ -242,9 +243,23 @@ TEST_F(RecordCommandTest, DiskWithoutRoomForAFrameLeavesTheOldRecording) {
                              "') 2>&1 | cat > '" + errors + "'";
     ASSERT_NE(std::system(("bash -c \"" + line + "\"").c_str()), -1);
     EXPECT_EQ(contentOf(errors), "vexatouch record: " + path +
-                                     ": cannot write: File too large; 0 frames are safe in it\n");
+                                     ": cannot write: File too large; no report had room, it is "
+                                     "as it was\n");
     EXPECT_EQ(contentOf(path), "precious");
     EXPECT_THAT(folder.names(), ElementsAre("errors", "session.json"));
+}
+
+TEST_F(RecordCommandTest, ServiceThatTakesNoReportsLeavesTheOldRecording) {
+    setenv(kVariable, VEXATOUCH_SAMPLE_PLUGINS "/TakesNoReports.so", 1);
+    const std::string path = folder.file("session.json", "precious");
+    EXPECT_EQ(runCommand({"record", path, "--force", "--device", asFastAsTaken("taps")}, {},
+                         Vexa::HostClock::system(), std::chrono::milliseconds(10)),
+              (CommandResult{1, "",
+                             "vexatouch record: the service takes no reports; its log says why; no "
+                             "report was recorded, " +
+                                 path + " is as it was\n"}));
+    EXPECT_EQ(contentOf(path), "precious");
+    EXPECT_THAT(folder.names(), ElementsAre("session.json"));
 }
 
 TEST_F(RecordCommandTest, NobodyReadingThePipeEndsItInOrder) {

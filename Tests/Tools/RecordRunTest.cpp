@@ -263,6 +263,28 @@ TEST_F(RecordRunTest, UnpluggedDeviceLeavesAWholeFile) {
     EXPECT_THAT(kept, Not(IsEmpty()));
 }
 
+TEST_F(RecordRunTest, UnpluggedDeviceThatSentNothingLeavesWhatWasThere) {
+    const std::string old = folder.file("old.json", "precious");
+    for (const std::string& file : {old, folder.path("new.json")}) {
+        PlayedDevice* unplugged = nullptr;
+        const auto device = std::make_shared<PlayedDevice>(
+            [&](const PlayedDevice::FrameSink&) { unplugged->unplug(); },
+            PlayedPace{.speed = RecordedDevice::kAsFastAsTaken, .lossless = true},
+            SurfaceIdentity{}, Vexa::HostClock::system());
+        unplugged = device.get();
+        try {
+            record(device, {}, openAppendTarget(file, true, streams));
+            ADD_FAILURE() << "the run does not say that the device is gone";
+        } catch (const Failure& failure) {
+            EXPECT_STREQ(failure.what(),
+                         "the device was unplugged; no report was recorded, session.json is as it "
+                         "was");
+        }
+    }
+    EXPECT_EQ(Testing::contentOf(old), "precious");
+    EXPECT_THAT(folder.names(), ::testing::ElementsAre("old.json"));
+}
+
 /// It cannot be opened.
 class ClosedDevice final : public PlayedDevice {
 public:

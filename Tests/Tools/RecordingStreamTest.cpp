@@ -43,6 +43,7 @@ struct Disk {
     bool closingFails = false;    ///< whatever comes after the failure fails, too
     int failWith = ENOSPC;
     int syncError = 0;
+    bool isKept = false;
     int syncs = 0;
     int writes = 0;
 };
@@ -74,6 +75,10 @@ public:
             return EIO;
         }
         disk_.content.resize(offset);
+        return 0;
+    }
+    int keep() noexcept override {
+        disk_.isKept = true;
         return 0;
     }
     int sync() noexcept override {
@@ -178,6 +183,55 @@ TEST(RecordingStreamTest, WhatCannotBeWrittenOverGetsItsBracketsAtTheEnd) {
     EXPECT_EQ(empty.content, textOf(frames, 0));
 }
 
+/// What cannot be written over is as good as kept from the beginning.
+std::string failureText(const std::string& fault, std::size_t frames, bool isKept) {
+    const std::string begin = "session.json: cannot write: " + fault + "; ";
+    return !isKept ? begin + "no report had room, it is as it was"
+                   : begin + std::to_string(frames) + (frames == 1 ? " frame is" : " frames are") +
+                         " safe in it";
+}
+
+TEST(RecordingStreamTest, SettingsAloneReplaceNothingButInARecordingThatEndedWell) {
+    RecordedSession session;
+    session.set("Algs.ActivationThreshold", 250.0).set("Algs.EnableTapSuppression", false);
+    const Frames settings(session.frames().begin(), session.frames().end());
+    Disk disk;
+    const auto stream = streamTo(disk);
+    stream->add(settings[0]);
+    stream->flush();
+    EXPECT_FALSE(disk.isKept);
+    stream->add(settings[1]);
+    EXPECT_STREQ(stream->finishAfter("the device was unplugged").what(),
+                 "the device was unplugged; no report was recorded, session.json is as it was");
+    EXPECT_FALSE(disk.isKept);
+    EXPECT_FALSE(stream->isFinished());
+    Disk ended;
+    EXPECT_EQ(record(*streamTo(ended), settings), "");
+    EXPECT_TRUE(ended.isKept);
+}
+
+TEST(RecordingStreamTest, TheFirstReportIsWorthAFileEvenIfItsSourceFails) {
+    RecordedSession session;
+    session.set("Algs.ActivationThreshold", 250.0).report({1});
+    Disk disk;
+    const auto stream = streamTo(disk);
+    stream->add(session.frames().front());
+    stream->flush();
+    stream->add(session.frames().back());
+    EXPECT_STREQ(stream->finishAfter("the device was unplugged").what(),
+                 "the device was unplugged");
+    EXPECT_TRUE(disk.isKept);
+    EXPECT_TRUE(stream->isFinished());
+    EXPECT_EQ(disk.content, containerText(session.frames()));
+}
+
+TEST(RecordingStreamTest, PipeGetsItsBracketsAlsoWhenTheSourceFailsWithoutAReport) {
+    Disk disk{.isRewritable = false};
+    EXPECT_STREQ(streamTo(disk)->finishAfter("the device was unplugged").what(),
+                 "the device was unplugged");
+    EXPECT_EQ(disk.content, containerText({}));
+}
+
 TEST(RecordingStreamTest, StateWithoutAValueDoesNotSpoilTheFile) {
     Disk disk;
     RecordedFrame frame;
@@ -256,9 +310,9 @@ TEST(RecordingStreamTest, FullDiskKeepsAWholeRecordingOfAllThatHasRoom) {
             ASSERT_EQ(disk.content, textOf(frames, fitting));
             ASSERT_EQ(stream->frames(), fitting);
             ASSERT_EQ(stream->bytes(), disk.content.size());
-            ASSERT_EQ(failure, "session.json: cannot write: No space left on device; " +
-                                   std::to_string(fitting) +
-                                   (fitting == 1 ? " frame is" : " frames are") + " safe in it");
+            // The second frame is the first report.
+            ASSERT_EQ(disk.isKept, fitting >= 2);
+            ASSERT_EQ(failure, failureText("No space left on device", fitting, disk.isKept));
             // Nothing is written any more.
             stream->add(frames[0]);
             stream->flush();
@@ -282,8 +336,7 @@ TEST(RecordingStreamTest, FailureOfAnyWriteKeepsTheFramesBeforeIt) {
         for (const bool closingFails : {false, true}) {
             Disk disk{.writesUntilFailure = good, .closingFails = closingFails, .failWith = EIO};
             const std::string failure = record(*streamTo(disk), frames);
-            EXPECT_THAT(failure, HasSubstr("session.json: cannot write: Input/output error; " +
-                                           std::to_string(whole)));
+            EXPECT_EQ(failure, failureText("Input/output error", whole, whole >= 2));
             // Where not even the brackets could be written, the old ones may still stand.
             EXPECT_EQ(containerText(recoverContainer(disk.content).frames), textOf(frames, whole));
         }

@@ -114,15 +114,12 @@ RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordO
         // The file says itself as far as where it is safe.
         throw;
     } catch (const std::runtime_error& error) {
-        stream.finish();
-        throw Failure(error.what());
+        throw stream.finishAfter(error.what());
+    }
+    if (writer.isFarEndGone()) {
+        throw stream.finishAfter("the surface was unplugged, or the daemon has ended");
     }
     stream.finish();
-    if (writer.isFarEndGone()) {
-        throw Failure(
-            "the surface was unplugged, or the daemon has ended; what came before is in " +
-            stream.name());
-    }
     return writer.summary();
 }
 

@@ -20,7 +20,7 @@ struct StreamedRecordOptions {
 /// Writes the frames that come through a descriptor, as FrameDecoder reads them, until SIGINT,
 /// SIGTERM or SIGHUP, after a time or a number of reports, or when the far end is done, and
 /// finishes the recording. A second signal ends the process. Throws Failure, also when the far end
-/// is done: the surface is gone then.
+/// is done: the surface is gone then. A failure without a report leaves what was there before.
 RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
                              RecordingStream& stream, Streams& streams);
 
