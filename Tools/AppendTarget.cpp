@@ -116,17 +116,26 @@ public:
     ReplacingFile& operator=(ReplacingFile&&) = delete;
 
     int keep() noexcept override {
-        if (!isKept_ && ::rename(temporary_.c_str(), path_.c_str()) != 0) {
+        if (isKept_) {
+            return 0;
+        }
+        // What was written is there, under either name.
+        isKept_ = true;
+        if (::rename(temporary_.c_str(), path_.c_str()) != 0) {
+            isBeside_ = true;
             return errno;
         }
-        isKept_ = true;
         return 0;
+    }
+    [[nodiscard]] std::string beside() const override {
+        return isBeside_ ? temporary_ : std::string();
     }
 
 private:
     const std::string temporary_;
     const std::string path_;
     bool isKept_ = false;
+    bool isBeside_ = false;  // its name could not be taken
 };
 
 /// The result stream. Each write is there for its reader when it returns.

@@ -124,9 +124,18 @@ void RecordingStream::write(bool withClosing) {
 }
 
 void RecordingStream::keepTarget() {
+    if (isKept_) {
+        return;
+    }
     if (const int error = target_->keep(); error != 0) {
         isDead_ = true;
-        fail(error);
+        const std::string beside = target_->beside();
+        if (beside.empty()) {
+            fail(error);
+        }
+        throw Failure(name_ + ": the new recording cannot take its place: " +
+                      std::generic_category().message(error) + "; " + framesText() + " safe in " +
+                      beside + ", and " + name_ + " is as it was");
     }
     isKept_ = true;
 }
@@ -178,8 +187,11 @@ void RecordingStream::fail(int error) const {
     if (target_->isRewritable() && !isKept_) {
         throw Failure(fault + "; no report had room, it is as it was");
     }
-    throw Failure(fault + "; " + std::to_string(frames_) +
-                  (frames_ == 1 ? " frame is" : " frames are") + " safe in it");
+    throw Failure(fault + "; " + framesText() + " safe in it");
+}
+
+std::string RecordingStream::framesText() const {
+    return std::to_string(frames_) + (frames_ == 1 ? " frame is" : " frames are");
 }
 
 }  // namespace VexaTouch::Tools

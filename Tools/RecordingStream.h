@@ -26,8 +26,9 @@ namespace VexaTouch::Tools {
 /// pipe) gets its closing brackets at the end.
 ///
 /// When the disk is full, or a write fails otherwise, the file is brought back to the last frame
-/// that has room together with the brackets. A file that gets no report leaves what was there before:
-/// settings alone are not worth an old recording. Only finish() keeps it all the same. One thread.
+/// that has room together with the brackets. A file that gets no report leaves what was there
+/// before: settings alone are not worth an old recording. Only finish() keeps it all the same. One
+/// thread.
 class RecordingStream {
 public:
     using Clock = std::chrono::steady_clock;
@@ -75,15 +76,16 @@ private:
     void saveWhatFits(std::size_t written) noexcept;
     void syncIfDue();
     [[noreturn]] void fail(int error) const;
+    [[nodiscard]] std::string framesText() const;
 
     std::unique_ptr<AppendTarget> target_;
     const std::string name_;
     const std::optional<std::chrono::nanoseconds> syncEvery_;
-    std::string text_;               // what the next flush writes
-    ContainerWriter writer_;         // into text_
-    std::vector<std::size_t> ends_;  // of the frames in text_
-    std::uint64_t end_ = 0;          // of the last frame in the file
-    std::uint64_t frames_ = 0;       // in the file
+    std::string text_;                          // what the next flush writes
+    ContainerWriter writer_;                    // into text_
+    std::vector<std::size_t> ends_;             // of the frames in text_
+    std::uint64_t end_ = 0;                     // of the last frame in the file
+    std::uint64_t frames_ = 0;                  // in the file
     std::optional<std::uint64_t> firstReport_;  // its place among the frames, from 0
     bool isDead_ = false;
     bool isKept_ = false;

@@ -109,6 +109,26 @@ TEST_F(AppendTargetTest, WhatIsNotKeptLeavesEverythingAsItWas) {
     EXPECT_THAT(folder.names(), ElementsAre("empty", "old"));
 }
 
+TEST_F(AppendTargetTest, FileWhoseNameCannotBeTakenStaysBesideIt) {
+    const std::string path = folder.file("old", "precious");
+    std::string beside;
+    {
+        const auto target = open(path, true);
+        target->write(0, "new");
+        EXPECT_EQ(target->beside(), "");
+        // A folder's name is taken by no file.
+        std::filesystem::remove(path);
+        std::filesystem::create_directory(path);
+        EXPECT_EQ(target->keep(), EISDIR);
+        beside = target->beside();
+    }
+    EXPECT_EQ(contentOf(beside), "new");
+    EXPECT_EQ(std::filesystem::path(beside).parent_path(),
+              std::filesystem::path(path).parent_path());
+    EXPECT_THAT(folder.names(),
+                ElementsAre(std::filesystem::path(beside).filename().string(), "old"));
+}
+
 TEST_F(AppendTargetTest, NewFileStaysWhenItIsKept) {
     const std::string path = folder.path("new");
     {

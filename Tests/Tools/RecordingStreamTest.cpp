@@ -44,6 +44,7 @@ struct Disk {
     int failWith = ENOSPC;
     int syncError = 0;
     bool isKept = false;
+    int keepError = 0;
     int syncs = 0;
     int writes = 0;
 };
@@ -78,8 +79,11 @@ public:
         return 0;
     }
     int keep() noexcept override {
-        disk_.isKept = true;
-        return 0;
+        disk_.isKept = disk_.keepError == 0;
+        return disk_.keepError;
+    }
+    [[nodiscard]] std::string beside() const override {
+        return disk_.keepError != 0 ? ".session.json.abc" : "";
     }
     int sync() noexcept override {
         ++disk_.syncs;
@@ -230,6 +234,15 @@ TEST(RecordingStreamTest, PipeGetsItsBracketsAlsoWhenTheSourceFailsWithoutARepor
     EXPECT_STREQ(streamTo(disk)->finishAfter("the device was unplugged").what(),
                  "the device was unplugged");
     EXPECT_EQ(disk.content, containerText({}));
+}
+
+TEST(RecordingStreamTest, RecordingThatCannotTakeItsPlaceSaysWhereItIs) {
+    const Frames frames = someFrames();
+    Disk disk{.keepError = EBUSY};
+    EXPECT_EQ(record(*streamTo(disk), frames),
+              "session.json: the new recording cannot take its place: Device or resource busy; 2 "
+              "frames are safe in .session.json.abc, and session.json is as it was");
+    EXPECT_EQ(disk.content, textOf(frames, 2));
 }
 
 TEST(RecordingStreamTest, StateWithoutAValueDoesNotSpoilTheFile) {
