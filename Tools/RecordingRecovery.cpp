@@ -1,9 +1,11 @@
 #include "Tools/RecordingRecovery.h"
 
 #include "Pipeline/ContainerReader.h"
+#include "Platform/JsonParser.h"
 #include "Tools/HidRecorderReader.h"
 
 #include <algorithm>
+#include <cstddef>
 #include <exception>
 #include <iterator>
 #include <new>
@@ -51,9 +53,48 @@ Attempt readFrom(std::string_view begin, std::string_view text) {
     return attempt;
 }
 
-// Whether a frame stands at the beginning of the text. Reads little more than that element, or the
-// search for a frame would read the rest of the text anew at each brace.
-bool beginsWithFrame(std::string_view begin, std::string_view text) {
+// How the object at the beginning of a text goes on, as far as it is JSON.
+struct Walk {
+    std::optional<std::size_t> end;  // behind it, where it is whole
+    // Braces and brackets of what is still open, outermost first.
+    std::vector<std::size_t> open;
+};
+
+Walk walk(std::string_view text) {
+    Walk walked;
+    bool isInText = false;
+    for (std::size_t at = 0; at < text.size(); ++at) {
+        const char character = text[at];
+        if (isInText) {
+            at += character == '\\' ? 1U : 0U;
+            isInText = character != '"';
+        } else if (character == '"') {
+            isInText = true;
+        } else if (character == '{' || character == '[') {
+            walked.open.push_back(at);
+        } else if ((character == '}' || character == ']') && !walked.open.empty()) {
+            walked.open.pop_back();
+            if (walked.open.empty()) {
+                walked.end = at + 1;
+                break;
+            }
+        }
+    }
+    return walked;
+}
+
+// What an object is.
+struct Probe {
+    enum class Outcome : std::uint8_t { IsFrame, Refused, Broken };
+
+    Outcome outcome;
+    std::size_t end;  // behind the object, or where it is broken
+};
+
+// What stands at the beginning of the text. Reads little more than that element, or the search for
+// a frame would read the rest of the text anew at each brace.
+Probe probe(std::string_view begin, std::string_view text) {
+    using Outcome = Probe::Outcome;
     constexpr std::size_t kFirstPiece = 64;
     ContainerReader reader;
     reader.write(begin);
@@ -61,14 +102,38 @@ bool beginsWithFrame(std::string_view begin, std::string_view text) {
     for (std::size_t read = 0; read < text.size(); read += piece, piece *= 2) {
         const bool isGood = reader.write(text.substr(read, piece));
         if (reader.wholeFrames() + reader.refusedFrames() > 0) {
-            // Pieces end anywhere: one of the next elements may be the frame, which does as well.
-            return reader.wholeFrames() > 0;
+            // Pieces end anywhere: what counts is the first element alone.
+            const std::size_t end = walk(text).end.value_or(text.size());
+            ContainerReader first;
+            first.write(begin);
+            first.write(text.substr(0, end));
+            return {first.wholeFrames() > 0 ? Outcome::IsFrame : Outcome::Refused, end};
         }
         if (!isGood) {
-            return false;
+            const std::uint64_t offset = reader.errorOffset().value_or(begin.size());
+            return {Outcome::Broken, offset - std::min<std::uint64_t>(offset, begin.size())};
         }
     }
-    return false;
+    return {Outcome::Broken, text.size()};
+}
+
+// Whether the text is a container with anything in it.
+bool isContainer(std::string_view text) {
+    ContainerReader reader;
+    reader.write(text);
+    return reader.wholeFrames() + reader.refusedFrames() > 0;
+}
+
+// Whether what stands before the text is more likely an element of an array than a member of an
+// object that is broken.
+bool isBehindElement(std::string_view text) {
+    constexpr std::string_view kWhite = " \n\r\t";
+    const std::size_t at = text.find_first_not_of(kWhite);
+    if (at == std::string_view::npos || text[at] == ']') {
+        return true;
+    }
+    const std::size_t next = text.find_first_not_of(kWhite, at + 1);
+    return text[at] == ',' && (next == std::string_view::npos || text[next] != '"');
 }
 
 // The rest of the text from the first object on that is a frame.
@@ -77,31 +142,82 @@ struct Resumed {
     Attempt attempt;
 };
 
-// Takes up reading after a fault at `faultAt`. The object that was being read when the fault showed
-// may have swallowed the beginning of a good one (a text without its closing quote), so the search
-// begins at the last brace before the fault; what comes no further than the fault is that object
-// itself, or one that has been read already.
-std::optional<Resumed> resume(std::string_view text, std::uint64_t faultAt,
-                              std::optional<std::uint32_t> version) {
-    const auto brace = faultAt == 0 ? std::string_view::npos : text.rfind('{', faultAt - 1);
-    for (auto position = brace == std::string_view::npos ? text.find('{') : brace;
-         position != std::string_view::npos; position = text.find('{', position + 1)) {
-        for (const std::string_view begin : {kBeginVersion1, kBeginVersion0}) {
-            if (version && (*version == 0) != (begin == kBeginVersion0)) {
-                continue;
+// Searches a text for where reading can be taken up again behind a fault.
+class Search {
+public:
+    explicit Search(std::string_view text) : text_(text) {}
+
+    // Takes up reading after a fault at `faultAt`. The object that was being read when the fault
+    // showed may have swallowed the beginning of a good one (a text without its closing quote), so
+    // the search begins at the last brace before the fault; what comes no further than the fault is
+    // that object itself, or one that has been read already.
+    std::optional<Resumed> resume(std::uint64_t faultAt, std::optional<std::uint32_t> version) {
+        isBroken_.resize(text_.size());
+        const auto brace = faultAt == 0 ? std::string_view::npos : text_.rfind('{', faultAt - 1);
+        std::size_t position = brace == std::string_view::npos ? text_.find('{') : brace;
+        while (position != std::string_view::npos) {
+            std::size_t next = position + 1;
+            if (!isBroken_[position]) {
+                const std::string_view rest = text_.substr(position);
+                bool isWhole = false;
+                bool isElement = false;
+                std::size_t brokenAt = 0;
+                for (const std::string_view begin : {kBeginVersion1, kBeginVersion0}) {
+                    if (version && (*version == 0) != (begin == kBeginVersion0)) {
+                        continue;
+                    }
+                    const Probe probed = probe(begin, rest);
+                    if (probed.outcome == Probe::Outcome::Broken) {
+                        brokenAt = std::max(brokenAt, probed.end);
+                        continue;
+                    }
+                    isWhole = true;
+                    if (probed.outcome == Probe::Outcome::IsFrame) {
+                        Attempt attempt = readFrom(begin, rest);
+                        if (!attempt.stopped || position + *attempt.stopped > faultAt) {
+                            return Resumed{position, std::move(attempt)};
+                        }
+                    }
+                    isElement = probed.outcome == Probe::Outcome::Refused;
+                    next = position + probed.end;
+                }
+                if (!isWhole) {
+                    markBroken(position, brokenAt);
+                }
+                // A damaged beginning makes an element of the container itself.
+                if (isElement && isContainer(text_.substr(position, next - position))) {
+                    next = position + 1;
+                } else if (isElement && next > faultAt && isBehindElement(text_.substr(next))) {
+                    ++refused_;
+                }
             }
-            if (!beginsWithFrame(begin, text.substr(position))) {
-                continue;
+            position = text_.find('{', next);
+        }
+        return std::nullopt;
+    }
+
+    // Whole elements that are no frames, which were passed over.
+    [[nodiscard]] std::uint64_t refused() const noexcept { return refused_; }
+
+private:
+    // What an object has open where it is broken is broken there as well. But for the innermost
+    // where only the nesting was too deep, which is less deep from there.
+    void markBroken(std::size_t position, std::size_t length) {
+        constexpr std::size_t kDeep = Vexa::kJsonMaxDepth - 8;
+        const Walk walked = walk(text_.substr(position, length));
+        std::size_t left = std::min(walked.open.size(), kDeep);
+        for (const std::size_t at : walked.open) {
+            if (left-- == 0) {
+                break;
             }
-            Attempt attempt = readFrom(begin, text.substr(position));
-            const bool further = !attempt.stopped || position + *attempt.stopped > faultAt;
-            if (further && !attempt.frames.empty()) {
-                return Resumed{position, std::move(attempt)};
-            }
+            isBroken_[position + at] = true;
         }
     }
-    return std::nullopt;
-}
+
+    std::string_view text_;
+    std::vector<bool> isBroken_;  // by the place of a brace
+    std::uint64_t refused_ = 0;
+};
 
 std::string elementsText(std::uint64_t refused) {
     return std::to_string(refused) +
@@ -122,13 +238,14 @@ RecordingRecovery recoverContainer(std::string_view text) {
         recovery.damages.push_back(attempt.fault);
     }
     std::uint64_t position = 0;
+    Search search(text);
     while (attempt.stopped) {
         position += *attempt.stopped;
         std::string damage = position >= text.size()
                                  ? "cut off after " + std::to_string(text.size()) + " bytes"
                                  : "no JSON at byte " + std::to_string(position);
         damage += " (" + attempt.syntaxError + ")";
-        std::optional<Resumed> resumed = resume(text, position, recovery.version);
+        std::optional<Resumed> resumed = search.resume(position, recovery.version);
         if (!resumed) {
             recovery.damages.push_back(std::move(damage));
             break;
@@ -140,6 +257,7 @@ RecordingRecovery recoverContainer(std::string_view text) {
         refused += attempt.refused;
         recovery.frames.append(std::move(attempt.frames));
     }
+    refused += search.refused();
     if (refused > 0) {
         recovery.damages.push_back(elementsText(refused));
     }

@@ -454,7 +454,48 @@ TEST(RecordingRecovery, ManyElementsThatAreNoFramesAreSearchedOnce) {
     ASSERT_EQ(recovery.frames.size(), 1U);
     EXPECT_EQ(recovery.frames.front().report, std::vector<std::uint8_t>{1});
     ASSERT_EQ(recovery.damages.size(), 2U);
-    EXPECT_THAT(recovery.damages[1], ::testing::EndsWith("no frames"));
+    EXPECT_EQ(recovery.damages[1], "200000 elements are no frames");
+}
+
+TEST(RecordingRecovery, ElementsBehindAFaultAreCountedToTheEndOfTheText) {
+    EXPECT_THAT(
+        Tools::recoverContainer(R"({"Version":1,"Frames":[!{},{"X":{}},{}]})").damages,
+        ElementsAre(::testing::StartsWith("no JSON at byte 23"), "3 elements are no frames"));
+    // The value of a damaged state frame is no element.
+    EXPECT_THAT(Tools::recoverContainer(
+                    R"({"Version":1,"Frames":[{"Type":"State",!"Value":{"x":1},"Key":"a"},{}]})")
+                    .damages,
+                ElementsAre(::testing::StartsWith("no JSON at byte 39"), "1 element is no frame"));
+}
+
+// What looks like a frame inside of an element that is none was never an input.
+TEST(RecordingRecovery, ObjectInsideOfAnElementThatIsNoFrameIsNoFrame) {
+    const Tools::RecordingRecovery recovery = Tools::recoverContainer(
+        R"({"Version":1,"Frames":[!{"X":{"Type":"InputReport","Timestamp":7,"Report":"07"}},)"
+        R"({"Type":"InputReport","Timestamp":1,"Report":"01"}]})");
+    ASSERT_EQ(recovery.frames.size(), 1U);
+    EXPECT_EQ(recovery.frames.front().report, std::vector<std::uint8_t>{1});
+    EXPECT_THAT(recovery.damages,
+                ElementsAre(::testing::HasSubstr("read on at byte 81"), "1 element is no frame"));
+}
+
+TEST(RecordingRecovery, WholeContainerBehindAFaultGivesItsFrames) {
+    const Frames frames = smallSession();
+    const std::string text = containerText(frames);
+    EXPECT_EQ(containerText(Tools::recoverContainer("!" + text).frames), text);
+    EXPECT_EQ(Tools::recoverContainer(text + text).frames.size(), 2 * frames.size());
+}
+
+// Each of these braces begins what only the end of the text shows to be no frame.
+TEST(RecordingRecovery, DeepNestingIsSearchedOnce) {
+    const std::string frame = R"({"Type":"InputReport","Timestamp":1,"Report":"01"})";
+    for (const std::string level : {R"({"a":)", R"({"x":[{"y":[)", R"({"a":{"b":1},"c":)"}) {
+        std::string text = R"({"Version":1,"Frames":[!)";
+        for (int i = 0; i < 100'000; ++i) {
+            text += level;
+        }
+        EXPECT_EQ(Tools::recoverContainer(text + "!" + frame).frames.size(), 1U) << level;
+    }
 }
 
 TEST(RecordingRecovery, WithoutItsBeginningARecordingStillHoldsFrames) {
