@@ -60,6 +60,16 @@ public:
 
     int close() noexcept override { return ::close(descriptor_.release()) == 0 ? 0 : errno; }
 
+protected:
+    /// Whether the open file is the one of that name. Another program may have given the name to a
+    /// file of its own meanwhile.
+    [[nodiscard]] bool isNamed(const std::string& path) const noexcept {
+        struct stat own{};
+        struct stat named{};
+        return ::fstat(descriptor_.get(), &own) == 0 && ::lstat(path.c_str(), &named) == 0 &&
+               own.st_dev == named.st_dev && own.st_ino == named.st_ino;
+    }
+
 private:
     FileDescriptor descriptor_;
     bool isRegular_;
@@ -76,10 +86,10 @@ public:
         if (isKept_) {
             return;
         }
-        if (wasMade_) {
+        if (!wasMade_) {
+            cut(0);
+        } else if (isNamed(path_)) {
             ::unlink(path_.c_str());
-        } else {
-            static_cast<void>(::truncate(path_.c_str(), 0) == 0);
         }
     }
     NewFile(const NewFile&) = delete;

@@ -109,6 +109,17 @@ TEST_F(AppendTargetTest, WhatIsNotKeptLeavesEverythingAsItWas) {
     EXPECT_THAT(folder.names(), ElementsAre("empty", "old"));
 }
 
+// Another program that records into the same file ends first.
+TEST_F(AppendTargetTest, WhatIsNotKeptLeavesTheFileOfAnother) {
+    for (const std::string& path : {folder.path("none"), folder.file("empty", "")}) {
+        const auto target = open(path);
+        target->write(0, "new");
+        std::filesystem::rename(folder.file("other", "precious"), path);
+    }
+    EXPECT_EQ(contentOf(folder.path("none")), "precious");
+    EXPECT_EQ(contentOf(folder.path("empty")), "precious");
+}
+
 TEST_F(AppendTargetTest, FileWhoseNameCannotBeTakenStaysBesideIt) {
     const std::string path = folder.file("old", "precious");
     std::string beside;
