@@ -87,7 +87,7 @@ public:
             return;
         }
         if (!wasMade_) {
-            cut(0);
+            DescriptorTarget::cut(0);
         } else if (isNamed(path_)) {
             ::unlink(path_.c_str());
         }

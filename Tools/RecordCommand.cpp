@@ -120,11 +120,13 @@ int printSummary(const RecordingStream& stream, const RecordSummary& summary, St
     if (lost == FrameGap{}) {
         return kExitSuccess;
     }
-    streams.error
-        << "vexatouch record: " << stream.name() << ": " << counted(lost.reports, "report")
-        << " and " << counted(lost.settings, "setting")
-        << " were lost, because the file was not written quickly enough; the rest is kept, "
-           "and Recording.LostReports stands in it where they are missing\n";
+    streams.error << "vexatouch record: " << stream.name() << ": "
+                  << counted(lost.reports, "report") << " and " << counted(lost.settings, "setting")
+                  << " were lost, because the file was not written quickly enough"
+                  << (stream.isKept()
+                          ? "; the rest is kept, and Recording.LostReports stands in it where "
+                            "they are missing\n"
+                          : "\n");
     return kExitFailure;
 }
 
@@ -140,7 +142,13 @@ int recordFromDaemon(const Arguments& arguments, Streams& streams) {
     const FileDescriptor frames = client.recordStream(client.choose(arguments));
     RecordingStream stream(openAppendTarget(file, arguments.given("--force"), streams),
                            file == "-" ? "standard output" : file, syncEvery);
-    const RecordSummary summary = Daemon::recordStreamed(frames, options, stream, streams);
+    RecordSummary summary;
+    try {
+        Daemon::recordStreamed(frames, options, stream, summary, streams);
+    } catch (...) {
+        printSummary(stream, summary, streams);
+        throw;
+    }
     return printSummary(stream, summary, streams);
 }
 
@@ -167,7 +175,7 @@ int runRecord(const Arguments& arguments, Streams& streams) {
                            file == "-" ? "standard output" : file, syncEvery);
     try {
         run.run(stream);
-    } catch (const Failure&) {
+    } catch (...) {
         printSummary(stream, run.summary(), streams);
         throw;
     }

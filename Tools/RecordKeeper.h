@@ -42,6 +42,8 @@ public:
     /// On a terminal, at most ten times a second.
     void drawProgress();
     void eraseProgress();
+    /// The answer to SIGUSR1.
+    void tellHowMuchThereIs();
     /// When there is something to be drawn again; nothing where there is no terminal.
     [[nodiscard]] std::optional<Time> progressDue() const noexcept;
 

@@ -134,13 +134,9 @@ void RecordRun::lookAfterReports() {
 }
 
 void RecordRun::answerUserSignal() {
-    if (!signals_.takeRecordingWanted()) {
-        return;
+    if (signals_.takeRecordingWanted()) {
+        keeper_->tellHowMuchThereIs();
     }
-    keeper_->eraseProgress();
-    streams_.error << "vexatouch record: " << stream_->frames() << " frames are in "
-                   << stream_->name() << "; what is written there is whole without SIGUSR1"
-                   << std::endl;
 }
 
 bool RecordRun::takeFrames() {

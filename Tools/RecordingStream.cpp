@@ -184,7 +184,7 @@ void RecordingStream::syncIfDue() {
 
 void RecordingStream::fail(int error) const {
     const std::string fault = name_ + ": cannot write: " + std::generic_category().message(error);
-    if (target_->isRewritable() && !isKept_) {
+    if (!isKept()) {
         throw Failure(fault + "; no report had room, it is as it was");
     }
     throw Failure(fault + "; " + framesText() + " safe in it");

@@ -65,6 +65,8 @@ public:
     /// Bytes of the file.
     [[nodiscard]] std::uint64_t bytes() const noexcept { return end_ + closingBytes(); }
     [[nodiscard]] const std::string& name() const noexcept { return name_; }
+    /// Whether the file stays as far as it is written.
+    [[nodiscard]] bool isKept() const noexcept { return isKept_ || !target_->isRewritable(); }
     [[nodiscard]] bool isFinished() const noexcept { return isFinished_; }
 
 private:

@@ -296,6 +296,23 @@ TEST_F(DaemonProgramTest, ARecordingFromTheDaemonShowsHowFarItIs) {
     EXPECT_TRUE(endedWith(record.end(), 0)) << record.output();
 }
 
+TEST_F(DaemonProgramTest, ARecordingFromTheDaemonAnswersTheUserSignalAndGoesOn) {
+    DaemonUnderTest daemon(bus->address());
+    daemon.source.plug(playedSurface("7", "sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture", true));
+    while (runCommand(atBus({"stats"})).out.find("running") == std::string::npos) {
+    }
+    const std::string file = folder.path("session.json");
+    ProgramRun record(atBus({"record", file}));
+    std::error_code none;
+    while (!std::filesystem::exists(file, none) ||
+           contentOf(file).find("InputReport") == std::string::npos) {
+    }
+    record.signal(SIGUSR1);
+    ASSERT_TRUE(record.readErrorUntil("is whole without SIGUSR1\n")) << record.error();
+    record.signal(SIGTERM);
+    EXPECT_TRUE(endedWith(record.end(), 0)) << record.error();
+}
+
 TEST_F(DaemonProgramTest, MonitorPrintsTheEventsOfTheService) {
     DaemonUnderTest daemon(bus->address());
     const auto expected = Tools::readExpectedEvents(VEXA_SOURCE_DIR "/Examples/taps.events");
@@ -372,7 +389,10 @@ TEST_F(DaemonProgramTest, ARecordingFromTheDaemonCanBeReplayed) {
     }
     daemon.source.unplug("7");
     EXPECT_TRUE(endedWith(cut.end(), 1));
-    EXPECT_THAT(cut.error(), HasSubstr("the surface was unplugged, or the daemon has ended"));
+    EXPECT_THAT(cut.error(),
+                ::testing::MatchesRegex(
+                    ".*/cut.json: [0-9]+ reports? and 27 settings, [0-9]+ bytes\n"
+                    "vexatouch record: the surface was unplugged, or the daemon has ended\n"));
     EXPECT_EQ(runCommand({"replay", folder.path("cut.json")}).exitCode, 0);
 }
 

@@ -25,14 +25,18 @@ using std::chrono::microseconds;
 class StreamWriter {
 public:
     StreamWriter(const FileDescriptor& frames, const StreamedRecordOptions& options,
-                 RecordingStream& stream, Streams& streams)
+                 RecordingStream& stream, RecordSummary& summary, Streams& streams)
         : frames_(frames),
           stream_(stream),
+          summary_(summary),
           keeper_(stream, options.count, streams),
           signals_(wake_),
           decoder_({.onFrame = [this](const RecordedFrame& frame) { keeper_.take(frame); },
                     .onGap = [this](const FrameGap& gap) { keeper_.take(gap); }}) {
         signalWatch_ = loop_.watch(wake_, [this] {
+            if (signals_.takeRecordingWanted()) {
+                keeper_.tellHowMuchThereIs();
+            }
             if (signals_.endWanted()) {
                 loop_.stop();
             }
@@ -52,15 +56,18 @@ public:
         try {
             loop_.run();
         } catch (...) {
-            keeper_.eraseProgress();
+            end();
             throw;
         }
-        keeper_.eraseProgress();
+        end();
     }
     [[nodiscard]] bool isFarEndGone() const { return gone_; }
-    [[nodiscard]] const RecordSummary& summary() const { return keeper_.summary(); }
 
 private:
+    void end() {
+        keeper_.eraseProgress();
+        summary_ = keeper_.summary();
+    }
     void read() {
         std::array<std::uint8_t, 65'536> bytes{};
         const ssize_t got = ::read(frames_.get(), bytes.data(), bytes.size());
@@ -89,6 +96,7 @@ private:
 
     const FileDescriptor& frames_;
     RecordingStream& stream_;
+    RecordSummary& summary_;
     RecordKeeper keeper_;
     bool gone_ = false;
     WakeUp wake_;
@@ -104,10 +112,10 @@ private:
 
 }  // namespace
 
-RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
-                             RecordingStream& stream, Streams& streams) {
+void recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
+                    RecordingStream& stream, RecordSummary& summary, Streams& streams) {
     static_cast<void>(::fcntl(frames.get(), F_SETFL, O_NONBLOCK));
-    StreamWriter writer(frames, options, stream, streams);
+    StreamWriter writer(frames, options, stream, summary, streams);
     try {
         writer.run();
     } catch (const Failure&) {
@@ -120,7 +128,6 @@ RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordO
         throw stream.finishAfter("the surface was unplugged, or the daemon has ended");
     }
     stream.finish();
-    return writer.summary();
 }
 
 }  // namespace VexaTouch::Tools::Daemon

@@ -21,7 +21,9 @@ struct StreamedRecordOptions {
 /// SIGTERM or SIGHUP, after a time or a number of reports, or when the far end is done, and
 /// finishes the recording. A second signal ends the process. Throws Failure, also when the far end
 /// is done: the surface is gone then. A failure without a report leaves what was there before.
-RecordSummary recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
-                             RecordingStream& stream, Streams& streams);
+/// `summary` is what went into the stream, also when this throws. SIGUSR1 is answered with how much
+/// there is.
+void recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
+                    RecordingStream& stream, RecordSummary& summary, Streams& streams);
 
 }  // namespace VexaTouch::Tools::Daemon
