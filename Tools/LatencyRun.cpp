@@ -2,6 +2,7 @@
 
 #include "Tools/Failure.h"
 #include "Tools/HostedDevice.h"
+#include "Tools/ReadingSwitch.h"
 #include "Tools/ReportWatch.h"
 #include "Tools/SimulatedSurface.h"
 #include "Tools/WakeUp.h"
@@ -80,7 +81,7 @@ class RecordingReader {
 public:
     explicit RecordingReader(const Host::HostSession& session)
         : thread_([this, &session] {
-              while (waitUntilOn()) {
+              while (switch_.waitUntilOn()) {
                   readOnce(session);
               }
           }) {}
@@ -89,10 +90,10 @@ public:
     RecordingReader& operator=(const RecordingReader&) = delete;
 
     /// Any thread.
-    void turn(bool on) noexcept { tell(on ? State::On : State::Off); }
+    void turn(bool on) noexcept { switch_.turn(on); }
     /// Ends the reading.
     void finish() {
-        tell(State::Finished);
+        switch_.finish();
         if (thread_.joinable()) {
             thread_.join();
         }
@@ -105,16 +106,6 @@ public:
     }
 
 private:
-    enum class State : int { Off, On, Finished };
-
-    void tell(State state) noexcept {
-        state_.store(state);
-        state_.notify_all();
-    }
-    bool waitUntilOn() const noexcept {
-        state_.wait(State::Off);
-        return state_.load() != State::Finished;
-    }
     void readOnce(const Host::HostSession& session) {
         const auto start = std::chrono::steady_clock::now();
         const Vexa::PropertyValue recording = session.property("Recording");
@@ -126,7 +117,7 @@ private:
         }
     }
 
-    std::atomic<State> state_ = State::Off;
+    ReadingSwitch switch_;
     std::uint64_t reads_ = 0;
     std::uint64_t readNs_ = 0;
     std::uint64_t bytes_ = 0;
