@@ -26,6 +26,7 @@
 #include <future>
 #include <memory>
 #include <optional>
+#include <semaphore>
 #include <span>
 #include <string>
 #include <string_view>
@@ -335,33 +336,33 @@ TEST_F(DaemonTest, ASurfaceThatComesBackHasItsSettings) {
               "surface 3, /dev/hidraw10, Surface 10: running\n");
 }
 
-/// A device whose feature reports are not answered until it is allowed.
-class SlowDevice final : public Tools::ForwardingDevice {
+/// A device whose feature reports are answered one by one, each once it is allowed.
+class GatedDevice final : public Tools::ForwardingDevice {
 public:
     using ForwardingDevice::ForwardingDevice;
 
-    std::promise<void> asked;
-    std::promise<void> allowed;
+    std::counting_semaphore<> asked{0};
+    std::counting_semaphore<> allowed{0};
+    std::atomic<int> requests = 0;
 
     vexa_status getReport(vexa_report_type type, std::uint32_t reportId,
                           std::span<std::uint8_t> report, std::size_t& length) noexcept override {
-        if (!wasAsked_.exchange(true)) {
-            asked.set_value();
-            allowed.get_future().get();
-        }
+        ++requests;
+        asked.release();
+        allowed.acquire();
         return ForwardingDevice::getReport(type, reportId, report, length);
     }
-
-private:
-    std::atomic<bool> wasAsked_ = false;
 };
+
+/// More than any test asks.
+constexpr int kAll = 1000;
 
 TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
     daemon.emplace(bus->address());
     client.emplace(bus->address());
     auto surface = playedSurface("7", example("taps"));
-    const auto slow = std::make_shared<SlowDevice>(surface.open());
-    surface.open = [slow] { return slow; };
+    const auto gated = std::make_shared<GatedDevice>(surface.open());
+    surface.open = [gated] { return gated; };
     daemon->source.plug(surface);
     waitForState(1, "running");
     Tools::Daemon::EventLoop loop;
@@ -379,11 +380,11 @@ TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
     // Both have been asked for when the one behind them is answered.
     static_cast<void>(caller.ask(caller.call(BusNames::kService, BusNames::kManagerPath,
                                              BusNames::kManager, "ListDevices")));
-    slow->asked.get_future().get();
+    gated->asked.acquire();
     daemon->source.unplug("7");
     while (!client->devices().empty()) {
     }
-    slow->allowed.set_value();
+    gated->allowed.release(kAll);
     caller.attach(loop, [&] { loop.stop(); });
     loop.run();
     // Gone altogether once its end has been counted.
@@ -397,6 +398,49 @@ TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
     daemon->source.plug(playedSurface("7", example("taps")));
     waitForState(2, "running");
     EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(300U));
+}
+
+TEST_F(DaemonTest, TheEndWaitsForNoMoreThanTheRequestThatIsUnderWay) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    auto surface = playedSurface("7", example("taps"));
+    const auto gated = std::make_shared<GatedDevice>(surface.open());
+    surface.open = [gated] { return gated; };
+    daemon->source.plug(surface);
+    waitForState(1, "running");
+    constexpr std::size_t kCalls = 6;
+    Bus caller(bus->address());
+    Tools::Daemon::EventLoop loop;
+    std::vector<std::string> answers;
+    std::vector<Tools::Daemon::BusSlot> slots;
+    const auto count = [&](const std::string& answer) {
+        answers.push_back(answer);
+        if (answers.size() == kCalls) {
+            loop.stop();
+        }
+    };
+    for (std::size_t i = 0; i < kCalls; ++i) {
+        BusMessage get = caller.call(BusNames::kService, first, BusNames::kDevice, "Get");
+        get.string("FirmwareVersion");
+        slots.push_back(caller.askLater(
+            get, [&](const BusMessage&) { count("answered"); },
+            [&](const BusError& error) { count(error.name() + ": " + error.what()); }));
+    }
+    // All have been asked for when the one behind them is answered.
+    static_cast<void>(caller.ask(caller.call(BusNames::kService, BusNames::kManagerPath,
+                                             BusNames::kManager, "ListDevices")));
+    gated->asked.acquire();
+    std::promise<void> ended;
+    daemon->call([&](Tools::Daemon::Daemon& under) { under.end([&] { ended.set_value(); }); });
+    gated->allowed.release(kAll);
+    ended.get_future().get();
+    EXPECT_EQ(gated->requests, 1);
+    caller.attach(loop, [&] { loop.stop(); });
+    loop.run();
+    std::vector<std::string> wanted(kCalls, std::string(Tools::Daemon::ErrorName::kNotRunning) +
+                                                ": the surface is being taken down");
+    wanted.front() = "answered";
+    EXPECT_EQ(answers, wanted);
 }
 
 TEST_F(DaemonTest, WhatWasSentJustBeforeTheUnplugIsTaken) {

@@ -124,6 +124,7 @@ SurfaceInstance::~SurfaceInstance() {
 }
 
 void SurfaceInstance::end(bool isUnplugged, std::function<void()> done) {
+    ending_ = true;
     setState(State::Ending, reason_);
     worker_.submit([this, isUnplugged, done = std::move(done)]() mutable noexcept {
         try {
@@ -202,7 +203,8 @@ void SurfaceInstance::takeGestures() {
 }
 
 template <typename Value, typename Work>
-void SurfaceInstance::ask(Work work, std::function<void(const Outcome<Value>& outcome)> done) {
+void SurfaceInstance::ask(AtTheEnd atTheEnd, Work work,
+                          std::function<void(const Outcome<Value>& outcome)> done) {
     if (state_ != State::Running) {
         throw BusError(
             ErrorName::kNotRunning,
@@ -212,25 +214,30 @@ void SurfaceInstance::ask(Work work, std::function<void(const Outcome<Value>& ou
         throw BusError(ErrorName::kBusy, "too many calls wait for this surface; try again");
     }
     ++waiting_;
-    worker_.submit([this, work = std::move(work), done = std::move(done)]() mutable noexcept {
-        Outcome<Value> outcome;
-        try {
-            outcome.value = work(*parts_);
-        } catch (const BusError& error) {
-            outcome.error = error;
-        } catch (const std::exception& error) {
-            outcome.error = BusError(ErrorName::kFailed, error.what());
-        }
-        loop_.post([this, outcome = std::move(outcome), done = std::move(done)] {
-            --waiting_;
-            done(outcome);
+    worker_.submit(
+        [this, atTheEnd, work = std::move(work), done = std::move(done)]() mutable noexcept {
+            Outcome<Value> outcome;
+            try {
+                if (ending_ && atTheEnd == AtTheEnd::Refused) {
+                    throw BusError(ErrorName::kNotRunning, "the surface is being taken down");
+                }
+                outcome.value = work(*parts_);
+            } catch (const BusError& error) {
+                outcome.error = error;
+            } catch (const std::exception& error) {
+                outcome.error = BusError(ErrorName::kFailed, error.what());
+            }
+            loop_.post([this, outcome = std::move(outcome), done = std::move(done)] {
+                --waiting_;
+                done(outcome);
+            });
         });
-    });
 }
 
 void SurfaceInstance::get(const std::string& key,
                           std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done) {
     ask<Vexa::PropertyValue>(
+        AtTheEnd::Refused,
         [key](Parts& parts) {
             Vexa::PropertyValue value = parts.session->property(key);
             if (!value) {
@@ -246,6 +253,7 @@ void SurfaceInstance::set(const std::string& key, const Vexa::PropertyValue& val
                           std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done) {
     const bool keeps = isSetting(key);
     ask<Vexa::PropertyValue>(
+        keeps ? AtTheEnd::Taken : AtTheEnd::Refused,
         [key, value, keeps](Parts& parts) {
             const Vexa::PropertyValue before = parts.session->property(key);
             if (!key.starts_with(kPipelineDomain) && !before) {
@@ -270,6 +278,7 @@ void SurfaceInstance::set(const std::string& key, const Vexa::PropertyValue& val
 
 void SurfaceInstance::reset(std::function<void(const Outcome<bool>& outcome)> done) {
     ask<bool>(
+        AtTheEnd::Taken,
         [](Parts& parts) {
             for (const auto& [key, value] : parts.defaults) {
                 if (!parts.tap->setProperty(*parts.session, key, value)) {
@@ -290,6 +299,7 @@ void SurfaceInstance::addFeed(
     const std::shared_ptr<FrameFeed>& feed,
     std::function<void(const Outcome<std::shared_ptr<InputTap>>& outcome)> done) {
     ask<std::shared_ptr<InputTap>>(
+        AtTheEnd::Refused,
         [feed](Parts& parts) {
             // Those that nobody reads any more are only ours.
             std::erase_if(parts.feeds, [](const auto& each) { return each.use_count() == 1; });

@@ -16,6 +16,7 @@
 #include "Tools/FrameFeed.h"
 #include "Tools/InputTap.h"
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
@@ -83,8 +84,9 @@ public:
     SurfaceInstance& operator=(SurfaceInstance&&) = delete;
 
     /// Takes everything back in order: device closed, unscheduled, stopped, released. What one that
-    /// is unplugged had sent before is taken first. Calls back last of all; no other callback comes
-    /// afterwards. Once.
+    /// is unplugged had sent before is taken first. Waits for the one question that is being
+    /// answered; of those behind it only settings are taken, the others are told NotRunning. Calls
+    /// back last of all; no other callback comes afterwards. Once.
     void end(bool isUnplugged, std::function<void()> done);
 
     [[nodiscard]] State state() const noexcept { return state_; }
@@ -124,8 +126,10 @@ private:
     void setState(State state, const std::string& reason);
     void deliver(const Vexa::HidEvent& event) EXCLUDES(lock_);
     void takeGestures() EXCLUDES(lock_);
+    /// Whether a question that is behind the end is answered all the same.
+    enum class AtTheEnd : std::uint8_t { Refused, Taken };
     template <typename Value, typename Work>
-    void ask(Work work, std::function<void(const Outcome<Value>& outcome)> done);
+    void ask(AtTheEnd atTheEnd, Work work, std::function<void(const Outcome<Value>& outcome)> done);
 
     EventLoop& loop_;
     const Host::PluginLibrary& library_;
@@ -135,6 +139,7 @@ private:
     State state_ = State::Starting;
     std::string reason_;
     std::size_t waiting_ = 0;
+    std::atomic<bool> ending_ = false;
     std::uint64_t gestures_ = 0;
     std::shared_ptr<LoopDevice> device_;  // once running
     std::unique_ptr<Parts> parts_;        // the worker's
