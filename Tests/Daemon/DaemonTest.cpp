@@ -1,5 +1,6 @@
 #include "Tools/Daemon/Daemon.h"
 
+#include "Platform/Json.h"
 #include "Platform/ScriptedDevice.h"
 #include "Shared/InputReport.h"
 #include "Tests/Daemon/DaemonUnderTest.h"
@@ -16,7 +17,9 @@
 
 #include <fcntl.h>
 #include <grp.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <array>
@@ -24,12 +27,14 @@
 #include <chrono>
 #include <fstream>
 #include <future>
+#include <map>
 #include <memory>
 #include <optional>
 #include <semaphore>
 #include <span>
 #include <string>
 #include <string_view>
+#include <thread>
 #include <utility>
 #include <vector>
 
@@ -673,6 +678,142 @@ TEST_F(DaemonAccessTest, WhoIsOnASeatMayWatchAndNothingElse) {
         EXPECT_THAT(ran.output, HasSubstr("root or the group vexatouch"));
     }
     EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(500U));
+}
+
+/// A connection whose other end takes it for this user's, in no group.
+std::unique_ptr<Bus> connectAs(uid_t user, const std::string& address) {
+    std::unique_ptr<Bus> bus;
+    std::thread([&] {
+        // The calls of the kernel, which unlike the library's are for this thread alone.
+        if (::syscall(SYS_setgroups, 0, nullptr) == 0 &&
+            ::syscall(SYS_setresuid, user, user, user) == 0) {
+            bus = std::make_unique<Bus>(address);
+        }
+    }).join();
+    return bus;
+}
+
+TEST_F(DaemonAccessTest, WhoMayOnlyWatchTakesNeitherThePlacesNorTheTimeOfOthers) {
+    auto surface = playedSurface("8", example("taps"));
+    const auto gated = std::make_shared<GatedDevice>(surface.open());
+    surface.open = [gated] { return gated; };
+    daemon->source.plug(surface);
+    waitForState(2, "running");
+    const std::string second = BusNames::devicePath(2);
+    Tools::Daemon::EventLoop loop;
+    constexpr std::size_t kConnections = 4;
+    constexpr std::size_t kCallsOfEach = 8;
+    std::vector<std::unique_ptr<Bus>> strangers;
+    std::vector<Tools::Daemon::BusSlot> slots;
+    std::map<std::string, std::size_t> answers;
+    const auto count = [&](const std::string& answer) {
+        ++answers[answer];
+        if (answers["answered"] + answers["busy"] == kConnections * kCallsOfEach) {
+            loop.stop();
+        }
+    };
+    const auto listDevices = [](Bus& from) {
+        return from.ask(from.call(BusNames::kService, BusNames::kManagerPath, BusNames::kManager,
+                                  "ListDevices"));
+    };
+    for (std::size_t i = 0; i < kConnections; ++i) {
+        Bus& stranger = *strangers.emplace_back(connectAs(kStranger, bus->address()));
+        for (std::size_t call = 0; call + 1 < kCallsOfEach; ++call) {
+            BusMessage get = stranger.call(BusNames::kService, second, BusNames::kDevice, "Get");
+            get.string("FirmwareVersion");
+            slots.push_back(stranger.askLater(
+                get, [&](const BusMessage&) { count("answered"); },
+                [&](const BusError& error) {
+                    EXPECT_EQ(error.name(), Tools::Daemon::ErrorName::kBusy) << error.what();
+                    count("busy");
+                }));
+        }
+        // All have been asked for when the one behind them is answered.
+        static_cast<void>(listDevices(stranger));
+        BusMessage statistics =
+            stranger.call(BusNames::kService, second, BusNames::kDevice, "GetStatistics");
+        slots.push_back(stranger.askLater(
+            statistics, [&](const BusMessage&) { count("answered"); },
+            [&](const BusError&) { count("busy"); }));
+        static_cast<void>(listDevices(stranger));
+    }
+    gated->asked.acquire();
+
+    // Root asks behind them and is next.
+    Tools::Daemon::EventLoop rootLoop;
+    Bus root(bus->address());
+    std::string now;
+    BusMessage set = root.call(BusNames::kService, second, BusNames::kDevice, "Set");
+    set.string(kHoldTimeout).value(300);
+    const auto slot = root.askLater(
+        set,
+        [&](BusMessage reply) {
+            now = Vexa::writeJson(reply.readValue());
+            rootLoop.stop();
+        },
+        [&](const BusError& error) {
+            now = error.what();
+            rootLoop.stop();
+        });
+    static_cast<void>(listDevices(root));
+    gated->allowed.release();
+    root.attach(rootLoop, [&] { rootLoop.stop(); });
+    rootLoop.run();
+    EXPECT_EQ(now, "300");
+    EXPECT_LE(gated->requests, 2);
+
+    gated->allowed.release(kAll);
+    for (const auto& stranger : strangers) {
+        stranger->attach(loop, [&] { loop.stop(); });
+    }
+    loop.run();
+    EXPECT_EQ(answers["answered"], Tools::Daemon::SurfaceInstance::kMostOfWatchers);
+    EXPECT_EQ(gated->requests, 4);
+}
+
+TEST_F(DaemonAccessTest, NobodyTakesAllPlacesOverManyConnections) {
+    auto surface = playedSurface("8", example("taps"));
+    const auto gated = std::make_shared<GatedDevice>(surface.open());
+    surface.open = [gated] { return gated; };
+    daemon->source.plug(surface);
+    waitForState(2, "running");
+    const std::string second = BusNames::devicePath(2);
+    constexpr std::size_t kMost = Tools::Daemon::SurfaceInstance::kMostOfUser;
+    constexpr std::size_t kConnections = 8;
+    constexpr std::size_t kCallsOfEach = 4;
+    static_assert(kConnections * kCallsOfEach > kMost);
+    Tools::Daemon::EventLoop loop;
+    std::vector<std::unique_ptr<Bus>> connections;
+    std::vector<Tools::Daemon::BusSlot> slots;
+    std::size_t answered = 0;
+    std::size_t busy = 0;
+    const auto count = [&](std::size_t& kind) {
+        ++kind;
+        if (answered + busy == kConnections * kCallsOfEach) {
+            loop.stop();
+        }
+    };
+    for (std::size_t i = 0; i < kConnections; ++i) {
+        Bus& caller = *connections.emplace_back(std::make_unique<Bus>(bus->address()));
+        for (std::size_t call = 0; call < kCallsOfEach; ++call) {
+            BusMessage get = caller.call(BusNames::kService, second, BusNames::kDevice, "Get");
+            get.string("FirmwareVersion");
+            slots.push_back(caller.askLater(
+                get, [&](const BusMessage&) { count(answered); },
+                [&](const BusError& error) {
+                    EXPECT_EQ(error.name(), Tools::Daemon::ErrorName::kBusy) << error.what();
+                    count(busy);
+                }));
+        }
+        static_cast<void>(caller.ask(caller.call(BusNames::kService, BusNames::kManagerPath,
+                                                 BusNames::kManager, "ListDevices")));
+    }
+    gated->allowed.release(kAll);
+    for (const auto& caller : connections) {
+        caller->attach(loop, [&] { loop.stop(); });
+    }
+    loop.run();
+    EXPECT_EQ(answered, kMost);
 }
 
 TEST_F(DaemonAccessTest, WhoIsOnNoSeatMayNotEvenWatch) {

@@ -65,7 +65,8 @@ void CallerRights::admit(BusMessage& call) {
     call.hold(std::make_shared<const std::shared_ptr<const char>>(waiting));
 }
 
-void CallerRights::demand(const BusMessage& call, Right right, std::function<void()> granted) {
+void CallerRights::demand(const BusMessage& call, Right right,
+                          std::function<void(const Caller& caller)> granted) {
     const std::string sender = call.sender();
     Asked asked{.slot = {}, .call = call, .right = right, .granted = std::move(granted)};
     if (const auto found = known_.find(sender); found != known_.end()) {
@@ -79,22 +80,22 @@ void CallerRights::demand(const BusMessage& call, Right right, std::function<voi
     BusMessage question =
         bus_.call(kBusName, "/org/freedesktop/DBus", kBusName, "GetConnectionCredentials");
     question.string(sender);
-    const auto finish = [this, number, sender](Right has, bool keep) {
+    const auto finish = [this, number, sender](const Caller& caller, bool keep) {
         const auto node = asked_.extract(number);
         if (keep) {
-            know(sender, has);
+            know(sender, caller);
         }
-        decide(node.mapped(), has);
+        decide(node.mapped(), caller);
     };
     asked.slot = bus_.askLater(
-        question, [this, finish](BusMessage credentials) { finish(rightFrom(credentials), true); },
+        question, [this, finish](BusMessage credentials) { finish(callerFrom(credentials), true); },
         // The caller has left meanwhile, or the bus does not tell.
-        [finish](const BusError&) { finish(Right::None, false); });
+        [finish](const BusError&) { finish(Caller{}, false); });
     asked_.emplace(number, std::move(asked));
 }
 
-void CallerRights::know(const std::string& sender, Right right) {
-    if (known_.emplace(sender, right).second) {
+void CallerRights::know(const std::string& sender, const Caller& caller) {
+    if (known_.emplace(sender, caller).second) {
         oldest_.push_back(sender);
     }
     if (oldest_.size() > kMostKnown) {
@@ -103,8 +104,8 @@ void CallerRights::know(const std::string& sender, Right right) {
     }
 }
 
-void CallerRights::decide(const Asked& asked, Right right) const {
-    if (right < asked.right) {
+void CallerRights::decide(const Asked& asked, const Caller& caller) const {
+    if (caller.right < asked.right) {
         const std::string who =
             asked.right == Right::Control
                 ? "this needs root or the group " + policy_.groupName
@@ -113,7 +114,7 @@ void CallerRights::decide(const Asked& asked, Right right) const {
         return;
     }
     try {
-        asked.granted();
+        asked.granted(caller);
     } catch (const BusError& error) {
         Bus::fail(asked.call, error);
     } catch (const std::exception& error) {
@@ -122,7 +123,7 @@ void CallerRights::decide(const Asked& asked, Right right) const {
     }
 }
 
-Right CallerRights::rightFrom(BusMessage& credentials) const {
+Caller CallerRights::callerFrom(BusMessage& credentials) const {
     std::optional<uid_t> user;
     std::vector<gid_t> groups;
     credentials.enter('a', "{sv}");
@@ -144,7 +145,7 @@ Right CallerRights::rightFrom(BusMessage& credentials) const {
         credentials.leave();
     }
     credentials.leave();
-    return user ? policy_.rightOf(*user, groups) : Right::None;
+    return user ? Caller{.right = policy_.rightOf(*user, groups), .user = *user} : Caller{};
 }
 
 }  // namespace VexaTouch::Tools::Daemon

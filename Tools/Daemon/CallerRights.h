@@ -23,6 +23,12 @@ enum class Right : std::uint8_t {
     Control,  ///< change settings, and see raw touches
 };
 
+/// Who calls, as far as it matters here.
+struct Caller {
+    Right right = Right::None;
+    uid_t user = 0;
+};
+
 /// Who may do what: root, the daemon's own user and the members of a group may control, users on a
 /// seat may watch.
 struct RightsPolicy {
@@ -44,8 +50,8 @@ class CallerRights {
 public:
     /// Callers that the bus is being asked about at the same time; beyond that they are told Busy.
     static constexpr std::size_t kMostAsked = 64;
-    /// Calls of one caller that wait for an answer at the same time, so that nobody takes the
-    /// places of all others.
+    /// Calls of one connection that wait for an answer at the same time, before it is known whose
+    /// it is as well. SurfaceInstance bounds those of a user.
     static constexpr long kMostOfOne = 8;
     /// Connections whose right is remembered.
     static constexpr std::size_t kMostKnown = 256;
@@ -57,23 +63,24 @@ public:
     void admit(BusMessage& call);
     /// Calls `granted` now or later if the caller has the right; otherwise the call is answered
     /// with AccessDenied, or Busy. What `granted` throws is the answer as well.
-    void demand(const BusMessage& call, Right right, std::function<void()> granted);
+    void demand(const BusMessage& call, Right right,
+                std::function<void(const Caller& caller)> granted);
 
 private:
     struct Asked {
         BusSlot slot;
         BusMessage call;
         Right right = Right::Control;
-        std::function<void()> granted;
+        std::function<void(const Caller& caller)> granted;
     };
 
-    void know(const std::string& sender, Right right);
-    void decide(const Asked& asked, Right right) const;
-    [[nodiscard]] Right rightFrom(BusMessage& credentials) const;
+    void know(const std::string& sender, const Caller& caller);
+    void decide(const Asked& asked, const Caller& caller) const;
+    [[nodiscard]] Caller callerFrom(BusMessage& credentials) const;
 
     Bus& bus_;
     RightsPolicy policy_;
-    std::map<std::string, Right> known_;  // a unique name is never given twice
+    std::map<std::string, Caller> known_;  // a unique name is never given twice
     std::deque<std::string> oldest_;
     std::map<std::uint64_t, Asked> asked_;
     std::uint64_t next_ = 0;

@@ -138,13 +138,16 @@ void DeviceObject::withdraw() {
     slot_ = {};
 }
 
-void DeviceObject::demand(const BusMessage& call, Right right, std::function<void()> granted) {
-    rights_.demand(call, right, [isOnBus = std::weak_ptr(isOnBus_), granted = std::move(granted)] {
-        if (isOnBus.expired()) {
-            throw BusError(ErrorName::kNotRunning, "the surface was unplugged");
-        }
-        granted();
-    });
+void DeviceObject::demand(const BusMessage& call, Right right,
+                          std::function<void(const Caller& caller)> granted) {
+    rights_.demand(
+        call, right,
+        [isOnBus = std::weak_ptr(isOnBus_), granted = std::move(granted)](const Caller& caller) {
+            if (isOnBus.expired()) {
+                throw BusError(ErrorName::kNotRunning, "the surface was unplugged");
+            }
+            granted(caller);
+        });
 }
 
 void DeviceObject::announceState() {
@@ -190,8 +193,8 @@ void DeviceObject::sayLost() {
 void DeviceObject::get(BusMessage call) {
     const std::string key = call.readKey();
     PropertyRules::checkRead(key);
-    demand(call, PropertyRules::rightToRead(key), [this, call, key] {
-        instance_.get(key, [this, call](const Outcome<PropertyValue>& outcome) {
+    demand(call, PropertyRules::rightToRead(key), [this, call, key](const Caller& caller) {
+        instance_.get(caller, key, [this, call](const Outcome<PropertyValue>& outcome) {
             Bus::answer(call, outcome.error, [&](BusMessage& reply) {
                 bus_.demandRoom(sizeInMemory(*outcome.value));
                 reply.value(*outcome.value);
@@ -203,9 +206,9 @@ void DeviceObject::get(BusMessage call) {
 void DeviceObject::set(BusMessage call) {
     const std::string key = call.readKey();
     const PropertyValue value = call.readValue();
-    demand(call, Right::Control, [this, call, key, value] {
+    demand(call, Right::Control, [this, call, key, value](const Caller& caller) {
         PropertyRules::checkWrite(key, value);
-        instance_.set(key, value, [call](const Outcome<PropertyValue>& outcome) {
+        instance_.set(caller, key, value, [call](const Outcome<PropertyValue>& outcome) {
             Bus::answer(call, outcome.error,
                         [&](BusMessage& reply) { reply.value(*outcome.value); });
         });
@@ -213,16 +216,16 @@ void DeviceObject::set(BusMessage call) {
 }
 
 void DeviceObject::reset(const BusMessage& call) {
-    demand(call, Right::Control, [this, call] {
-        instance_.reset([call](const Outcome<bool>& outcome) {
+    demand(call, Right::Control, [this, call](const Caller& caller) {
+        instance_.reset(caller, [call](const Outcome<bool>& outcome) {
             Bus::answer(call, outcome.error, [](BusMessage&) {});
         });
     });
 }
 
 void DeviceObject::getRecording(const BusMessage& call) {
-    demand(call, Right::Control, [this, call] {
-        instance_.get(kRecordingKey, [this, call](const Outcome<PropertyValue>& outcome) {
+    demand(call, Right::Control, [this, call](const Caller& caller) {
+        instance_.get(caller, kRecordingKey, [this, call](const Outcome<PropertyValue>& outcome) {
             Bus::answer(call, outcome.error, [&](BusMessage& reply) {
                 bus_.demandRoom(sizeInMemory(*outcome.value));
                 const auto text = outcome.value->asString();
@@ -233,21 +236,23 @@ void DeviceObject::getRecording(const BusMessage& call) {
 }
 
 void DeviceObject::recordStream(const BusMessage& call) {
-    demand(call, Right::Control, [this, call] {
+    demand(call, Right::Control, [this, call](const Caller& caller) {
         RecordStreams::Opened opened = streams_.open(path_);
         const auto reader = std::make_shared<FileDescriptor>(std::move(opened.reader));
         RecordStreams& streams = streams_;
         try {
-            instance_.addFeed(opened.feed, [&streams, call, feed = opened.feed, reader](
-                                               const Outcome<std::shared_ptr<InputTap>>& outcome) {
-                if (outcome.value) {
-                    streams.started(feed, *outcome.value);
-                } else {
-                    streams.abandon(feed);
-                }
-                Bus::answer(call, outcome.error,
-                            [&](BusMessage& reply) { reply.descriptor(*reader); });
-            });
+            instance_.addFeed(caller, opened.feed,
+                              [&streams, call, feed = opened.feed,
+                               reader](const Outcome<std::shared_ptr<InputTap>>& outcome) {
+                                  if (outcome.value) {
+                                      streams.started(feed, *outcome.value);
+                                  } else {
+                                      streams.abandon(feed);
+                                  }
+                                  Bus::answer(call, outcome.error, [&](BusMessage& reply) {
+                                      reply.descriptor(*reader);
+                                  });
+                              });
         } catch (const std::exception&) {
             streams_.abandon(opened.feed);
             throw;
@@ -256,7 +261,7 @@ void DeviceObject::recordStream(const BusMessage& call) {
 }
 
 void DeviceObject::getStatistics(const BusMessage& call) {
-    demand(call, Right::Watch, [this, call] {
+    demand(call, Right::Watch, [this, call](const Caller& caller) {
         const auto answer = [this, call](const PropertyValue& eventStats) {
             const PropertyValue all = statistics(eventStats);
             Bus::reply(call, [&all](BusMessage& reply) { reply.dictionary(all); });
@@ -265,7 +270,7 @@ void DeviceObject::getStatistics(const BusMessage& call) {
             answer({});
             return;
         }
-        instance_.get(SurfaceInstance::kEventStatsKey,
+        instance_.get(caller, SurfaceInstance::kEventStatsKey,
                       [answer](const Outcome<PropertyValue>& outcome) {
                           answer(outcome.value ? *outcome.value : PropertyValue());
                       });

@@ -46,7 +46,8 @@ public:
 
 private:
     /// Calls `granted` if the caller has the right and this object is still on the bus then.
-    void demand(const BusMessage& call, Right right, std::function<void()> granted);
+    void demand(const BusMessage& call, Right right,
+                std::function<void(const Caller& caller)> granted);
     [[nodiscard]] Vexa::PropertyValue statistics(const Vexa::PropertyValue& eventStats) const;
     void sayLost();
 

@@ -71,7 +71,7 @@ void ManagerObject::announceRemoved(const std::string& path) {
 }
 
 void ManagerObject::listDevices(const BusMessage& call) {
-    rights_.demand(call, Right::Watch, [this, call] {
+    rights_.demand(call, Right::Watch, [this, call](const Caller&) {
         Bus::reply(call, [this](BusMessage& reply) {
             reply.open('a', "o");
             for (const std::string& path : paths_()) {

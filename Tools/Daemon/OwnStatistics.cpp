@@ -89,7 +89,7 @@ private:
             return;
         }
         isEnding_ = true;
-        instance_->get(SurfaceInstance::kEventStatsKey,
+        instance_->get({.right = Right::Control}, SurfaceInstance::kEventStatsKey,
                        [this](const Outcome<Vexa::PropertyValue>& outcome) {
                            eventStats_ = outcome.value.value_or(Vexa::PropertyValue());
                            end();

@@ -14,17 +14,14 @@ namespace {
 
 constexpr std::string_view kPipeline = "Pipeline.";
 constexpr std::string_view kAlgorithm = "Pipeline.Algs.";
+constexpr std::string_view kVersion = "Version";
 constexpr std::string_view kRecording = "Recording";
+constexpr std::string_view kDisjointImageCount = "DisjointImageCount";
 constexpr std::string_view kDebug = "ServicePluginDebug";
 /// What the service answers itself. Written, they would only hide in the device.
 constexpr std::array<std::string_view, 7> kOfTheService = {
-    "Version",
-    "Recording",
-    "DisjointImageCount",
-    "FirmwareVersion",
-    "FactoryResetHoldDuration",
-    kDebug,
-    "CriticalErrors",
+    kVersion, kRecording,       kDisjointImageCount, "FirmwareVersion", "FactoryResetHoldDuration",
+    kDebug,   "CriticalErrors",
 };
 
 [[noreturn]] void unknown(std::string_view key) {
@@ -70,6 +67,10 @@ bool isOfPipeline(std::string_view key) {
 
 Right PropertyRules::rightToRead(std::string_view key) {
     return key == kRecording || key == kDebug ? Right::Control : Right::Watch;
+}
+
+bool PropertyRules::asksDevice(std::string_view key) {
+    return !isOfPipeline(key) && key != kVersion && key != kRecording && key != kDisjointImageCount;
 }
 
 void PropertyRules::checkRead(std::string_view key) {

@@ -15,6 +15,9 @@ inline constexpr std::size_t kLongestKey = 128;
 /// Control for what carries raw touches, Watch for all else.
 Right rightToRead(std::string_view key);
 
+/// Whether the device is asked for it, which may take as long as the kernel waits for an answer.
+bool asksDevice(std::string_view key);
+
 /// Throws BusError (UnknownKey) for a key that is too long, or in the domain "Pipeline" and not to
 /// be read there: an index is a plain number below the count.
 void checkRead(std::string_view key);

@@ -2,6 +2,7 @@
 
 #include "Platform/HostClock.h"
 #include "Shared/Util.h"
+#include "Tools/Daemon/PropertyRules.h"
 #include "Tools/ObservedDevice.h"
 #include "Tools/SettingKeys.h"
 
@@ -126,6 +127,10 @@ SurfaceInstance::~SurfaceInstance() {
 void SurfaceInstance::end(bool isUnplugged, std::function<void()> done) {
     ending_ = true;
     setState(State::Ending, reason_);
+    // They are told so; nothing may come behind the end.
+    while (!held_.empty()) {
+        submitHeld();
+    }
     worker_.submit([this, isUnplugged, done = std::move(done)]() mutable noexcept {
         try {
             if (parts_->session) {
@@ -202,42 +207,86 @@ void SurfaceInstance::takeGestures() {
     hooks_.onGestures(taken);
 }
 
+void SurfaceInstance::takePlace(const Question& question) {
+    const auto found = waitingOf_.find(question.caller.user);
+    const std::size_t ofUser = found == waitingOf_.end() ? 0 : found->second;
+    if (question.isWatchers() && waitingOfWatchers_ >= kMostOfWatchers) {
+        throw BusError(
+            ErrorName::kBusy,
+            "too many calls of users who may only watch wait for this surface; try again");
+    }
+    if (ofUser >= kMostOfUser) {
+        throw BusError(ErrorName::kBusy, "too many of your calls wait for this surface; try again");
+    }
+    if (waiting_ >= kMostWaiting) {
+        throw BusError(ErrorName::kBusy, "too many calls wait for this surface; try again");
+    }
+    ++waiting_;
+    ++waitingOf_[question.caller.user];
+    waitingOfWatchers_ += question.isWatchers() ? 1 : 0;
+}
+
+void SurfaceInstance::leavePlace(const Question& question) {
+    --waiting_;
+    if (const auto ofUser = waitingOf_.find(question.caller.user); --ofUser->second == 0) {
+        waitingOf_.erase(ofUser);
+    }
+    waitingOfWatchers_ -= question.isWatchers() ? 1 : 0;
+    if (question.isOneByOne()) {
+        isOneAsked_ = false;
+        submitHeld();
+    }
+}
+
+void SurfaceInstance::submitHeld() {
+    if (!held_.empty()) {
+        isOneAsked_ = true;
+        worker_.submit([task = std::move(held_.front())]() noexcept { task(); });
+        held_.pop_front();
+    }
+}
+
 template <typename Value, typename Work>
-void SurfaceInstance::ask(AtTheEnd atTheEnd, Work work,
+void SurfaceInstance::ask(const Question& question, Work work,
                           std::function<void(const Outcome<Value>& outcome)> done) {
     if (state_ != State::Running) {
         throw BusError(
             ErrorName::kNotRunning,
             "the surface is not running: " + (reason_.empty() ? "it is " + stateText() : reason_));
     }
-    if (waiting_ >= kMostWaiting) {
-        throw BusError(ErrorName::kBusy, "too many calls wait for this surface; try again");
-    }
-    ++waiting_;
-    worker_.submit(
-        [this, atTheEnd, work = std::move(work), done = std::move(done)]() mutable noexcept {
-            Outcome<Value> outcome;
-            try {
-                if (ending_ && atTheEnd == AtTheEnd::Refused) {
-                    throw BusError(ErrorName::kNotRunning, "the surface is being taken down");
-                }
-                outcome.value = work(*parts_);
-            } catch (const BusError& error) {
-                outcome.error = error;
-            } catch (const std::exception& error) {
-                outcome.error = BusError(ErrorName::kFailed, error.what());
+    takePlace(question);
+    auto task = [this, question, work = std::move(work),
+                 done = std::move(done)]() mutable noexcept {
+        Outcome<Value> outcome;
+        try {
+            if (ending_ && !question.isOfSettings) {
+                throw BusError(ErrorName::kNotRunning, "the surface is being taken down");
             }
-            loop_.post([this, outcome = std::move(outcome), done = std::move(done)] {
-                --waiting_;
-                done(outcome);
-            });
+            outcome.value = work(*parts_);
+        } catch (const BusError& error) {
+            outcome.error = error;
+        } catch (const std::exception& error) {
+            outcome.error = BusError(ErrorName::kFailed, error.what());
+        }
+        loop_.post([this, question, outcome = std::move(outcome), done = std::move(done)] {
+            leavePlace(question);
+            done(outcome);
         });
+    };
+    if (!question.isOneByOne()) {
+        worker_.submit(std::move(task));
+        return;
+    }
+    held_.emplace_back(std::move(task));
+    if (!isOneAsked_) {
+        submitHeld();
+    }
 }
 
-void SurfaceInstance::get(const std::string& key,
+void SurfaceInstance::get(const Caller& caller, const std::string& key,
                           std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done) {
     ask<Vexa::PropertyValue>(
-        AtTheEnd::Refused,
+        {.caller = caller, .asksDevice = PropertyRules::asksDevice(key)},
         [key](Parts& parts) {
             Vexa::PropertyValue value = parts.session->property(key);
             if (!value) {
@@ -249,11 +298,12 @@ void SurfaceInstance::get(const std::string& key,
         std::move(done));
 }
 
-void SurfaceInstance::set(const std::string& key, const Vexa::PropertyValue& value,
+void SurfaceInstance::set(const Caller& caller, const std::string& key,
+                          const Vexa::PropertyValue& value,
                           std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done) {
     const bool keeps = isSetting(key);
     ask<Vexa::PropertyValue>(
-        keeps ? AtTheEnd::Taken : AtTheEnd::Refused,
+        {.caller = caller, .asksDevice = PropertyRules::asksDevice(key), .isOfSettings = keeps},
         [key, value, keeps](Parts& parts) {
             const Vexa::PropertyValue before = parts.session->property(key);
             if (!key.starts_with(kPipelineDomain) && !before) {
@@ -276,9 +326,10 @@ void SurfaceInstance::set(const std::string& key, const Vexa::PropertyValue& val
         });
 }
 
-void SurfaceInstance::reset(std::function<void(const Outcome<bool>& outcome)> done) {
+void SurfaceInstance::reset(const Caller& caller,
+                            std::function<void(const Outcome<bool>& outcome)> done) {
     ask<bool>(
-        AtTheEnd::Taken,
+        {.caller = caller, .isOfSettings = true},
         [](Parts& parts) {
             for (const auto& [key, value] : parts.defaults) {
                 if (!parts.tap->setProperty(*parts.session, key, value)) {
@@ -296,10 +347,10 @@ void SurfaceInstance::reset(std::function<void(const Outcome<bool>& outcome)> do
 }
 
 void SurfaceInstance::addFeed(
-    const std::shared_ptr<FrameFeed>& feed,
+    const Caller& caller, const std::shared_ptr<FrameFeed>& feed,
     std::function<void(const Outcome<std::shared_ptr<InputTap>>& outcome)> done) {
     ask<std::shared_ptr<InputTap>>(
-        AtTheEnd::Refused,
+        {.caller = caller},
         [feed](Parts& parts) {
             // Those that nobody reads any more are only ours.
             std::erase_if(parts.feeds, [](const auto& each) { return each.use_count() == 1; });

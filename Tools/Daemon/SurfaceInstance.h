@@ -8,6 +8,7 @@
 #include "Platform/SerialQueue.h"
 #include "Platform/ThreadAnnotations.h"
 #include "Tools/Daemon/BusError.h"
+#include "Tools/Daemon/CallerRights.h"
 #include "Tools/Daemon/DeviceSource.h"
 #include "Tools/Daemon/EventLoop.h"
 #include "Tools/Daemon/LoopDevice.h"
@@ -19,6 +20,7 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <deque>
 #include <functional>
 #include <map>
 #include <memory>
@@ -53,12 +55,18 @@ struct Gestures {
 /// One surface with its own instance of the plug-in, from being plugged in to being taken down.
 ///
 /// All that may wait for the device (the plug-in's life, its properties) happens on a thread of its
-/// own, in the order in which it was asked for; the loop's thread asks and is answered. Public
-/// operations are for the loop's thread.
+/// own, in the order in which it was asked for; the loop's thread asks and is answered. Of the
+/// questions to the device whose callers may only watch no more than one is in that order at a
+/// time, so that those who may control wait for no more than that one. Public operations are for
+/// the loop's thread.
 class SurfaceInstance {
 public:
     /// Questions that wait; beyond that the answer is Busy.
     static constexpr std::size_t kMostWaiting = 32;
+    /// Of these, of one user, over however many connections they come.
+    static constexpr std::size_t kMostOfUser = 16;
+    /// Of these, of all who may only watch, so that there is always room for those who may control.
+    static constexpr std::size_t kMostOfWatchers = 4;
     /// Gestures that wait for the loop; beyond that they are dropped and counted.
     static constexpr std::size_t kMostGestures = 1024;
 
@@ -102,18 +110,18 @@ public:
 
     // Each throws BusError (NotRunning, Busy) or calls back later.
 
-    void get(const std::string& key,
+    void get(const Caller& caller, const std::string& key,
              std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done);
     /// Gives what the property is afterwards; no value when it cannot be read.
-    void set(const std::string& key, const Vexa::PropertyValue& value,
+    void set(const Caller& caller, const std::string& key, const Vexa::PropertyValue& value,
              std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done);
     /// Writes back every setting as it was when the plug-in started, and forgets them.
-    void reset(std::function<void(const Outcome<bool>& outcome)> done);
+    void reset(const Caller& caller, std::function<void(const Outcome<bool>& outcome)> done);
     /// The algorithm's own counters, for statisticsOf.
     static constexpr const char* kEventStatsKey = "Pipeline.Algs.EventStats";
 
     /// Fills the feed from now on. The tap is for removing it again.
-    void addFeed(const std::shared_ptr<FrameFeed>& feed,
+    void addFeed(const Caller& caller, const std::shared_ptr<FrameFeed>& feed,
                  std::function<void(const Outcome<std::shared_ptr<InputTap>>& outcome)> done);
 
     /// Calls back once the thread that takes the reports has answered, or when there is none that
@@ -126,10 +134,21 @@ private:
     void setState(State state, const std::string& reason);
     void deliver(const Vexa::HidEvent& event) EXCLUDES(lock_);
     void takeGestures() EXCLUDES(lock_);
-    /// Whether a question that is behind the end is answered all the same.
-    enum class AtTheEnd : std::uint8_t { Refused, Taken };
+    struct Question {
+        Caller caller;
+        bool asksDevice = false;
+        bool isOfSettings = false;  // answered even behind the end
+
+        [[nodiscard]] bool isWatchers() const noexcept { return caller.right < Right::Control; }
+        /// Whether there is no more than one such at a time.
+        [[nodiscard]] bool isOneByOne() const noexcept { return isWatchers() && asksDevice; }
+    };
     template <typename Value, typename Work>
-    void ask(AtTheEnd atTheEnd, Work work, std::function<void(const Outcome<Value>& outcome)> done);
+    void ask(const Question& question, Work work,
+             std::function<void(const Outcome<Value>& outcome)> done);
+    void takePlace(const Question& question);
+    void leavePlace(const Question& question);
+    void submitHeld();
 
     EventLoop& loop_;
     const Host::PluginLibrary& library_;
@@ -139,6 +158,10 @@ private:
     State state_ = State::Starting;
     std::string reason_;
     std::size_t waiting_ = 0;
+    std::map<uid_t, std::size_t> waitingOf_;  // by user
+    std::size_t waitingOfWatchers_ = 0;
+    bool isOneAsked_ = false;                 // of those that go one by one
+    std::deque<std::function<void()>> held_;  // those behind it
     std::atomic<bool> ending_ = false;
     std::uint64_t gestures_ = 0;
     std::shared_ptr<LoopDevice> device_;  // once running
