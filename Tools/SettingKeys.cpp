@@ -6,6 +6,7 @@
 #include "Tools/Failure.h"
 
 #include <algorithm>
+#include <cmath>
 #include <sstream>
 #include <utility>
 
@@ -82,6 +83,10 @@ Setting parseSetting(std::string_view text, std::string_view option) {
     Vexa::PropertyValue value = Vexa::readJson(text.substr(equals + 1));
     if (!value) {
         refuse(given, "the value is no JSON");
+    }
+    // A recording has no text for infinity.
+    if (value.isNumber() && !std::isfinite(value.toFloat())) {
+        refuse(given, "the value is not finite as a 32-bit float");
     }
     return {.key = std::string(kPipelinePrefix) + std::string(key), .value = std::move(value)};
 }

@@ -28,7 +28,8 @@ std::string hostKey(std::string_view key);
 
 /// Reads KEY=VALUE: the key in any of the three forms of hostKey, the value as JSON. Throws
 /// UsageError, with the list of keys, for a key that nothing knows, a read-only key, an index out
-/// of range or a value that is no JSON. `option` is what the text was given to, for the message.
+/// of range, a value that is no JSON or a number that is not finite as a float. `option` is what
+/// the text was given to, for the message.
 Setting parseSetting(std::string_view text, std::string_view option = "--set");
 std::vector<Setting> parseSettings(std::span<const std::string> texts,
                                    std::string_view option = "--set");

@@ -27,6 +27,7 @@
 #include <chrono>
 #include <fstream>
 #include <future>
+#include <limits>
 #include <map>
 #include <memory>
 #include <optional>
@@ -55,6 +56,7 @@ using Tools::Daemon::DaemonClient;
 using Vexa::PropertyValue;
 namespace BusNames = Tools::Daemon::BusNames;
 
+constexpr const char* kActivation = "Pipeline.Algs.ActivationThreshold";
 constexpr const char* kHoldTimeout = "Pipeline.Algs.HoldTimeoutMilliseconds";
 /// In the example "taps".
 constexpr std::uint64_t kReportsOfTaps = 112;
@@ -161,8 +163,7 @@ TEST_F(DaemonTest, ASettingIsTakenAndReadBack) {
     start();
     EXPECT_EQ(client->set(first, kHoldTimeout, 300), PropertyValue(300U));
     EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(300U));
-    EXPECT_EQ(client->set(first, "Pipeline.Algs.ActivationThreshold", 150.5),
-              PropertyValue(150.5F));
+    EXPECT_EQ(client->set(first, kActivation, 150.5), PropertyValue(150.5F));
     EXPECT_EQ(client->set(first, "Pipeline.Algs.ResetEventStats", true).type(),
               PropertyValue::Type::None);
     EXPECT_EQ(client->set(first, "Product", "Mine"), PropertyValue("Mine"));
@@ -182,6 +183,10 @@ TEST_F(DaemonTest, WhatIsNoSettingIsNotTakenAndNotRecorded) {
         {kHoldTimeout, PropertyValue::null(), "InvalidValue"},
         {kHoldTimeout, PropertyValue::Array{1}, "InvalidValue"},
         {kHoldTimeout, PropertyValue(), "InvalidValue"},
+        {kActivation, std::numeric_limits<double>::infinity(), "InvalidValue"},
+        {kActivation, -std::numeric_limits<float>::infinity(), "InvalidValue"},
+        {kActivation, std::numeric_limits<double>::quiet_NaN(), "InvalidValue"},
+        {kActivation, 1e39, "InvalidValue"},
         {"Pipeline.Algs.EventStats", 1, "ReadOnly"},
         {"Pipeline.DebugInfo", 1, "ReadOnly"},
         {"Version", 1, "ReadOnly"},

@@ -65,6 +65,15 @@ TEST(SettingKeysTest, ValuesAreAnyJson) {
     }
 }
 
+TEST(SettingKeysTest, ANumberMustBeFiniteAsAFloat) {
+    for (const std::string number : {"1e400", "-1e400", "1e39", "-3.5e38"}) {
+        EXPECT_EQ(
+            reason("ActivationThreshold=" + number),
+            "--set ActivationThreshold=" + number + ": the value is not finite as a 32-bit float");
+    }
+    EXPECT_EQ(parseSetting("ActivationThreshold=-3.4e38").value, PropertyValue(-3.4e38));
+}
+
 TEST(SettingKeysTest, EveryWritableKeyIsTakenAndReachesTheAlgorithm) {
     for (const StateKeyEntry& entry : kStateKeys) {
         const std::string key = std::string(entry.name) + (entry.indexed ? ".22" : "");

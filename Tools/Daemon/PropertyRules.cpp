@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <cmath>
 #include <string>
 #include <system_error>
 
@@ -106,6 +107,11 @@ void PropertyRules::checkWrite(std::string_view key, const Vexa::PropertyValue& 
     if (!value.isNumber() && value.type() != Vexa::PropertyValue::Type::Boolean) {
         throw BusError(ErrorName::kInvalidValue,
                        std::string(key) + ": the value must be a boolean or a number");
+    }
+    // A recording has no text for it, so that a replay would not decide as was felt.
+    if (!std::isfinite(value.toFloat())) {
+        throw BusError(ErrorName::kInvalidValue,
+                       std::string(key) + ": the value must be finite as a 32-bit float");
     }
 }
 

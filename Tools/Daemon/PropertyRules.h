@@ -23,8 +23,9 @@ bool asksDevice(std::string_view key);
 void checkRead(std::string_view key);
 
 /// Throws BusError for a key that is too long or not to be written, and for a value that is not of
-/// the key's kind: settings are booleans and numbers. Of other domains than "Pipeline" it knows
-/// only the service's own keys, which are read-only; whether the device has a key it must be asked.
+/// the key's kind: settings are booleans and finite numbers. Of other domains than "Pipeline" it
+/// knows only the service's own keys, which are read-only; whether the device has a key it must be
+/// asked.
 void checkWrite(std::string_view key, const Vexa::PropertyValue& value);
 
 }  // namespace VexaTouch::Tools::Daemon::PropertyRules
