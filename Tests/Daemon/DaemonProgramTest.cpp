@@ -257,6 +257,25 @@ TEST_F(DaemonProgramTest, DevicesAreThoseThatTheDaemonServes) {
                       HasSubstr("      3  09 01             Usage (0x01)\n")));
 }
 
+TEST_F(DaemonProgramTest, WhatADeviceSaysOfItselfReachesNoTerminalAsItIs) {
+    DaemonUnderTest daemon(bus->address());
+    auto surface = playedSurface("7", example("taps"));
+    surface.name = "Left\x1b[2J\nsurface 2: running";
+    surface.open = []() -> std::shared_ptr<Vexa::DeviceBackend> {
+        throw Tools::Failure("no\x1b[2Jpermission");
+    };
+    daemon.source.plug(surface);
+    std::string shown;
+    do {
+        shown = runCommand(atBus({"stats"})).out;
+    } while (shown.find(", failed") == std::string::npos);
+    EXPECT_THAT(shown, StartsWith("surface 1, /dev/hidraw7, Left?[2J?surface 2: running, failed, "
+                                  "no?[2Jpermission\n  "));
+    daemon.stop();
+    EXPECT_EQ(daemon.log(),
+              "surface 1, /dev/hidraw7, Left?[2J?surface 2: running: no?[2Jpermission\n");
+}
+
 TEST_F(DaemonProgramTest, WithoutADaemonDevicesLooksItself) {
     const CommandResult itself = runCommand({"devices", "--json", "--device", "hidraw"});
     EXPECT_EQ(itself.exitCode, 0) << itself.error;

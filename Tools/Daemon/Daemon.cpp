@@ -1,6 +1,7 @@
 #include "Tools/Daemon/Daemon.h"
 
 #include "Tools/Daemon/BusNames.h"
+#include "Tools/TerminalText.h"
 
 #include <sys/epoll.h>
 
@@ -21,8 +22,9 @@ struct Daemon::Device {
         const PluggedSurface& surface = instance->surface();
         std::string text = "surface " + std::to_string(number);
         text += surface.node.empty() ? "" : ", " + surface.node;
+        // The device says its own name, to terminals and logs as well.
         text += surface.name.empty() ? "" : ", " + surface.name;
-        return text;
+        return forTerminal(std::move(text));
     }
 };
 
@@ -92,7 +94,7 @@ void Daemon::stateChanged(Device& device) {
             log_ << device.title() << ": running" << std::endl;
             break;
         case SurfaceInstance::State::Failed:
-            log_ << device.title() << ": " << device.instance->reason() << std::endl;
+            log_ << device.title() << ": " << forTerminal(device.instance->reason()) << std::endl;
             break;
         case SurfaceInstance::State::Starting:
         case SurfaceInstance::State::Ending:

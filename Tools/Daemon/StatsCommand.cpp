@@ -9,6 +9,7 @@
 #include "Tools/Failure.h"
 #include "Tools/OptionValues.h"
 #include "Tools/SignalWatch.h"
+#include "Tools/TerminalText.h"
 #include "Tools/WakeUp.h"
 
 #include <array>
@@ -70,13 +71,13 @@ void printLines(const Daemon::DaemonClient::Device& device, const Vexa::Property
     streams.out << "surface " << device.number;
     for (const std::string_view key : {"Node", "Name", "State", "Reason"}) {
         const std::string value = text(key);
-        streams.out << (value.empty() ? "" : ", ") << value;
+        streams.out << (value.empty() ? "" : ", ") << forTerminal(value);
     }
     streams.out << '\n';
     if (const auto members = statistics.asDictionary()) {
         for (const auto& [key, value] : *members) {
-            streams.out << "  " << key << ": "
-                        << Vexa::writeJson(value, Vexa::JsonWriter::Style::Compact) << '\n';
+            const std::string json = Vexa::writeJson(value, Vexa::JsonWriter::Style::Compact);
+            streams.out << "  " << forTerminal(std::string(key) + ": " + json) << '\n';
         }
     }
 }
