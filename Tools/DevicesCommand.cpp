@@ -59,7 +59,8 @@ constexpr std::array<OptionEntry, 5> kOptions = {{
 constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
     {kExitSuccess, "the devices were listed, and be it none"},
     {kExitFailure,
-     "the devices cannot be listed, the daemon refuses, or none is on the bus that --bus names"},
+     "the devices cannot be listed, or on the bus that --bus names there is no daemon or it "
+     "refuses"},
     {kExitUsage, "the command line is wrong"},
 }};
 
@@ -71,10 +72,10 @@ constexpr std::array<ExampleEntry, 4> kExamples = {{
 }};
 
 constexpr std::string_view kDescription =
-    "Lists the touch surfaces that are plugged in. When a daemon is on the bus they are those that "
-    "it serves, each with its number and state; otherwise, or with --device hidraw or --match, "
-    "they "
-    "are looked up without being opened. With --verbose the devices that are no surface, or that "
+    "Lists the touch surfaces that are plugged in. When a daemon is on the bus and lets the caller "
+    "watch they are those that it serves, each with its number and state; otherwise, or with "
+    "--device hidraw or --match, they are looked up without being opened. With --verbose the "
+    "devices that are no surface, or that "
     "the daemon does not serve, follow.\n"
     "\n"
     "A device is a surface if its report descriptor declares, on a vendor's usage page, input "
@@ -320,6 +321,23 @@ std::vector<Listed> listWithDaemon(Daemon::DaemonClient& client) {
     return all;
 }
 
+/// The same when the daemon lets the caller watch; else it is done with, which is said, unless the
+/// command line asks for it by its bus.
+std::vector<Listed> listWithDaemon(std::unique_ptr<Daemon::DaemonClient>& client,
+                                   const Arguments& arguments, Streams& streams) {
+    try {
+        return listWithDaemon(*client);
+    } catch (const Daemon::AccessDenied&) {
+        if (arguments.given(kBusOption.name)) {
+            throw;
+        }
+        client.reset();
+        streams.error << "the daemon lets only users on a seat, root and the group vexatouch "
+                         "watch; shown is what is plugged in, without what it serves\n";
+        return listDevices({});
+    }
+}
+
 /// The node that --device names; empty for all.
 std::string nodeOption(const Arguments& arguments) {
     if (!arguments.given(kWhereOption.name)) {
@@ -362,8 +380,9 @@ int runDevices(const Arguments& arguments, Streams& streams) {
     const bool json = arguments.given("--json");
     const std::string node = nodeOption(arguments);
     const Host::SurfaceMatch match = matchOption(arguments);
-    const auto client = findDaemon(arguments);
-    std::vector<Listed> devices = client ? listWithDaemon(*client) : listDevices(match);
+    auto client = findDaemon(arguments);
+    std::vector<Listed> devices =
+        client ? listWithDaemon(client, arguments, streams) : listDevices(match);
     if (!node.empty()) {
         std::erase_if(devices, [&](const Listed& listed) { return listed.device.node != node; });
         if (devices.empty()) {

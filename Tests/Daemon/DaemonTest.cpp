@@ -831,6 +831,24 @@ TEST_F(DaemonAccessTest, WhoIsOnNoSeatMayNotEvenWatch) {
     }
 }
 
+TEST_F(DaemonAccessTest, DevicesLooksItselfForWhomTheDaemonDoesNotLetWatch) {
+    setenv("DBUS_SYSTEM_BUS_ADDRESS", bus->address().c_str(), 1);
+    EXPECT_THAT(runAs(kStranger, {}, {"devices"}).output, HasSubstr("surface 1, running"));
+    const Ran itself = runAs(kStranger, {}, {"devices", "--json", "--device", "hidraw"});
+    onSeat = false;
+    const Ran refused = runAs(kStranger, {}, {"devices", "--json"});
+    unsetenv("DBUS_SYSTEM_BUS_ADDRESS");
+    EXPECT_EQ(refused.exitCode, 0);
+    EXPECT_EQ(refused.output,
+              "the daemon lets only users on a seat, root and the group vexatouch watch; shown is "
+              "what is plugged in, without what it serves\n" +
+                  itself.output);
+    // Who names a bus wants the daemon on it.
+    const Ran named = run({"devices"});
+    EXPECT_EQ(named.exitCode, 1);
+    EXPECT_THAT(named.output, HasSubstr("a user on a seat, root or the group vexatouch"));
+}
+
 TEST_F(DaemonAccessTest, MembersOfTheGroupMayDoEverything) {
     onSeat = false;
     EXPECT_EQ(run({"set", kHoldTimeout, "300"}, {1, kGroup, 2}).output,

@@ -84,7 +84,11 @@ BusMessage DaemonClient::ask(const BusMessage& call) {
                           "\": start it with systemctl start vexatouch or vexatouch daemon, or " +
                           otherwise_);
         }
-        throw Failure(std::string(error.what()) + " (" + error.name() + ')');
+        const std::string text = std::string(error.what()) + " (" + error.name() + ')';
+        if (error.name() == ErrorName::kAccessDenied) {
+            throw AccessDenied(text);
+        }
+        throw Failure(text);
     }
 }
 

@@ -3,6 +3,7 @@
 #include "Platform/PropertyValue.h"
 #include "Tools/CommandTable.h"
 #include "Tools/Daemon/Bus.h"
+#include "Tools/Failure.h"
 #include "Tools/FileDescriptor.h"
 
 #include <memory>
@@ -11,8 +12,15 @@
 
 namespace VexaTouch::Tools::Daemon {
 
+/// The daemon, or its bus, does not let the caller.
+class AccessDenied : public Failure {
+public:
+    using Failure::Failure;
+};
+
 /// The command line's end of the daemon's interface. Each operation waits for the answer and throws
-/// Failure with what was asked for, what was wrong and the error's name. One thread.
+/// Failure with what was asked for, what was wrong and the error's name, AccessDenied where it is
+/// that. One thread.
 class DaemonClient {
 public:
     struct Device {
