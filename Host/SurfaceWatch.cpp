@@ -52,6 +52,19 @@ std::string propertyOf(udev_device* device, const char* key) {
     return textOf(udev_device_get_property_value(device, key));
 }
 
+/// What udev tells after its rules were applied, the second one when it is triggered anew.
+bool isNews(std::string_view action) {
+    return action == "add" || action == "change";
+}
+
+/// Whether who takes these changes looks at the surface anyway, as after an event that was on its
+/// way while the list was made.
+bool isTold(const std::vector<SurfaceChange>& changes, std::string_view sysPath) {
+    return std::ranges::any_of(changes, [sysPath](const SurfaceChange& change) {
+        return change.kind != SurfaceChange::Kind::Removed && change.surface.sysPath == sysPath;
+    });
+}
+
 /// Empty when it cannot be read, as that of a device that has gone.
 std::vector<std::uint8_t> readDescriptor(const std::string& path) {
     std::vector<std::uint8_t> bytes;
@@ -215,6 +228,8 @@ void SurfaceWatch::takeEvents(std::vector<SurfaceChange>& changes) {
             if (!surface || !match_.matches(*surface)) continue;
             known_.emplace(path, *surface);
             changes.push_back({SurfaceChange::Kind::Added, *std::move(surface)});
+        } else if (action != nullptr && isNews(action) && !isTold(changes, path)) {
+            changes.push_back({SurfaceChange::Kind::Changed, known->second});
         }
     }
 }
@@ -222,6 +237,7 @@ void SurfaceWatch::takeEvents(std::vector<SurfaceChange>& changes) {
 std::vector<Surface> findSurfaces(const SurfaceMatch& match) {
     std::vector<Surface> surfaces;
     for (SurfaceChange& change : SurfaceWatch(match).takeChanges()) {
+        if (change.kind != SurfaceChange::Kind::Added) continue;
         surfaces.push_back(std::move(change.surface));
     }
     return surfaces;

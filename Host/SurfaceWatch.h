@@ -12,9 +12,15 @@
 
 namespace VexaTouch::Host {
 
-/// A surface has come or gone.
+/// A surface has come or gone, or there is news of one that is there.
 struct SurfaceChange {
-    enum class Kind : std::uint8_t { Added, Removed };
+    enum class Kind : std::uint8_t {
+        Added,
+        Removed,
+        /// The system told of it anew, as when its node has got other permissions; what the surface
+        /// says of itself is as before.
+        Changed,
+    };
 
     Kind kind = Kind::Added;
     Surface surface;
@@ -22,8 +28,8 @@ struct SurfaceChange {
     friend bool operator==(const SurfaceChange&, const SurfaceChange&) = default;
 };
 
-/// Finds surfaces: those that are there and those that come and go. It has no thread and no timer;
-/// while nothing is plugged or unplugged it does nothing at all. One thread.
+/// Finds surfaces: those that are there and those that come, change and go. It has no thread and no
+/// timer; while nothing is plugged or unplugged it does nothing at all. One thread.
 ///
 /// It acts on udev's events, which come when udev has set a node's permissions. Where udev does not
 /// run (/run/udev/control is missing) the kernel's own events must do; whoever sets permissions

@@ -502,6 +502,39 @@ TEST_F(DaemonTest, ASurfaceThatCannotBeOpenedSaysWhy) {
     EXPECT_EQ(client->statistics(first).member("Reports"), PropertyValue(0U));
 }
 
+TEST_F(DaemonTest, ASurfaceThatFailedIsBegunAnewWhenThereIsNewsOfIt) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    std::atomic<bool> permitted = false;
+    auto surface = playedSurface("7", example("taps"));
+    surface.open = [&permitted, open = surface.open]() -> std::shared_ptr<Vexa::DeviceBackend> {
+        if (!permitted) {
+            throw Failure("/dev/hidraw7: no permission");
+        }
+        return open();
+    };
+    daemon->source.plug(surface);
+    waitForState(1, "failed");
+    daemon->source.touch(surface);
+    waitForState(2, "failed");
+    permitted = true;
+    daemon->source.touch(surface);
+    waitForState(3, "running");
+    // One that runs is left alone.
+    client->set(BusNames::devicePath(3), kHoldTimeout, 300);
+    daemon->source.touch(surface);
+    daemon->source.plug(playedSurface("8", example("taps")));
+    waitForState(4, "running");
+    EXPECT_THAT(client->devices(), SizeIs(2));
+    EXPECT_EQ(client->get(BusNames::devicePath(3), kHoldTimeout), PropertyValue(300U));
+    daemon->stop();
+    EXPECT_EQ(daemon->log(),
+              "surface 1, /dev/hidraw7, Surface 7: /dev/hidraw7: no permission\n"
+              "surface 2, /dev/hidraw7, Surface 7: /dev/hidraw7: no permission\n"
+              "surface 3, /dev/hidraw7, Surface 7: running\n"
+              "surface 4, /dev/hidraw8, Surface 8: running\n");
+}
+
 TEST_F(DaemonTest, AFloodOfCallsIsAnsweredOrToldThatItIsTooMuch) {
     start();
     Tools::Daemon::EventLoop loop;

@@ -35,10 +35,14 @@ public:
     PluggedByHand() : event_(eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
 
     void plug(Tools::Daemon::PluggedSurface surface) {
-        put({.added = true, .surface = std::move(surface)});
+        put({.kind = Kind::Added, .surface = std::move(surface)});
+    }
+    /// There is news of this surface.
+    void touch(Tools::Daemon::PluggedSurface surface) {
+        put({.kind = Kind::Changed, .surface = std::move(surface)});
     }
     void unplug(const std::string& id) {
-        Tools::Daemon::PlugChange change{.added = false, .surface = {}};
+        Tools::Daemon::PlugChange change{.kind = Kind::Removed, .surface = {}};
         change.surface.id = id;
         put(std::move(change));
     }
@@ -52,6 +56,8 @@ public:
     }
 
 private:
+    using Kind = Tools::Daemon::PlugChange::Kind;
+
     void put(Tools::Daemon::PlugChange change) {
         const std::lock_guard guard(lock_);
         changes_.push_back(std::move(change));

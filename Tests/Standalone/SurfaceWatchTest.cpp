@@ -29,9 +29,10 @@ namespace VexaTouch::Host {
 
 // Found by the tests' printer.
 static void PrintTo(const SurfaceChange& change, std::ostream* out) {
-    *out << (change.kind == SurfaceChange::Kind::Added ? "added " : "removed ")
-         << change.surface.node << ' ' << change.surface.sysPath << " \"" << change.surface.name
-         << "\", " << change.surface.reportDescriptor.size() << " bytes";
+    static constexpr std::array kKinds = {"added ", "removed ", "changed "};
+    *out << kKinds.at(static_cast<std::size_t>(change.kind)) << change.surface.node << ' '
+         << change.surface.sysPath << " \"" << change.surface.name << "\", "
+         << change.surface.reportDescriptor.size() << " bytes";
 }
 
 }  // namespace VexaTouch::Host
@@ -61,6 +62,7 @@ using testing::IsEmpty;
 
 constexpr auto kAdded = SurfaceChange::Kind::Added;
 constexpr auto kRemoved = SurfaceChange::Kind::Removed;
+constexpr auto kChanged = SurfaceChange::Kind::Changed;
 
 /// A descriptor of nothing.
 const std::vector<std::uint8_t> kNoReports = {0x06, 0x60, 0xFF, 0x09, 0x01, 0xA1, 0x01, 0xC0};
@@ -108,7 +110,11 @@ TEST_P(SurfaceWatchTest, TellsWhatComesAndGoes) {
     const Surface surface = surfaceOf(ours_, 3, path);
     EXPECT_THAT(nextChanges(watch), ElementsAre(SurfaceChange{kAdded, surface}));
     // Whoever triggers udev anew.
-    devices_.announce(3, "change");
+    for (const char* action : {"change", "add"}) {
+        devices_.announce(3, action);
+        EXPECT_THAT(nextChanges(watch), ElementsAre(SurfaceChange{kChanged, surface}));
+    }
+    devices_.announce(3, "move");
     EXPECT_THAT(nextChanges(watch), IsEmpty());
     devices_.unplug(3);
     EXPECT_THAT(nextChanges(watch), ElementsAre(SurfaceChange{kRemoved, surface}));

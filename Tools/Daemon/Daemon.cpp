@@ -52,10 +52,16 @@ Daemon::~Daemon() = default;
 
 void Daemon::takeChanges() {
     for (PlugChange& change : source_.takeChanges()) {
-        if (change.added) {
-            add(std::move(change.surface));
-        } else {
-            remove(change.surface.id);
+        switch (change.kind) {
+            case PlugChange::Kind::Added:
+                add(std::move(change.surface));
+                break;
+            case PlugChange::Kind::Removed:
+                remove(change.surface.id);
+                break;
+            case PlugChange::Kind::Changed:
+                tryAgain(std::move(change.surface));
+                break;
         }
     }
 }
@@ -109,13 +115,25 @@ void Daemon::stateChanged(Device& device) {
 }
 
 void Daemon::remove(const std::string& id) {
+    if (Device* device = find(id)) {
+        log_ << device->title() << ": unplugged" << std::endl;
+        takeDown(*device, true);
+    }
+}
+
+void Daemon::tryAgain(PluggedSurface surface) {
+    Device* device = find(surface.id);
+    if (device != nullptr && device->instance->state() == SurfaceInstance::State::Failed) {
+        takeDown(*device, false);
+        add(std::move(surface));
+    }
+}
+
+Daemon::Device* Daemon::find(const std::string& id) const {
     const auto found = std::ranges::find_if(devices_, [&](const auto& device) {
         return device->plugged && device->instance->surface().id == id;
     });
-    if (found != devices_.end()) {
-        log_ << (*found)->title() << ": unplugged" << std::endl;
-        takeDown(**found, true);
-    }
+    return found == devices_.end() ? nullptr : found->get();
 }
 
 void Daemon::takeDown(Device& device, bool isUnplugged) {

@@ -84,6 +84,8 @@ private:
     void takeChanges();
     void add(PluggedSurface surface);
     void remove(const std::string& id);
+    void tryAgain(PluggedSurface surface);
+    [[nodiscard]] Device* find(const std::string& id) const;
     void takeDown(Device& device, bool isUnplugged);
     void taken(Device& device);
     void stateChanged(Device& device);

@@ -36,7 +36,13 @@ struct PluggedSurface {
 };
 
 struct PlugChange {
-    bool added = true;
+    enum class Kind : std::uint8_t {
+        Added,
+        Removed,
+        Changed,  ///< there is news of one that is there: what failed before may go now
+    };
+
+    Kind kind = Kind::Added;
     PluggedSurface surface;  ///< of one that was removed only the id counts
 };
 

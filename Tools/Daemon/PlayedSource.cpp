@@ -30,7 +30,7 @@ void PlayedSource::add(std::string name, std::shared_ptr<ObservedDevice> device)
     PluggedSurface surface = surfaceOf(std::move(name), std::move(device));
     surface.id = std::to_string(++last_);
     surface.physicalPath = surface.id;
-    changes_.push_back({.added = true, .surface = std::move(surface)});
+    changes_.push_back({.kind = PlugChange::Kind::Added, .surface = std::move(surface)});
 }
 
 std::vector<PlugChange> PlayedSource::takeChanges() {

@@ -24,13 +24,24 @@ PluggedSurface pluggedSurface(const Host::Surface& found) {
     return surface;
 }
 
+PlugChange::Kind kindOf(Host::SurfaceChange::Kind kind) {
+    switch (kind) {
+        case Host::SurfaceChange::Kind::Added:
+            return PlugChange::Kind::Added;
+        case Host::SurfaceChange::Kind::Removed:
+            return PlugChange::Kind::Removed;
+        case Host::SurfaceChange::Kind::Changed:
+            break;
+    }
+    return PlugChange::Kind::Changed;
+}
+
 }  // namespace
 
 std::vector<PlugChange> WatchedSource::takeChanges() {
     std::vector<PlugChange> changes;
     for (const Host::SurfaceChange& change : watch_.takeChanges()) {
-        changes.push_back({.added = change.kind == Host::SurfaceChange::Kind::Added,
-                           .surface = pluggedSurface(change.surface)});
+        changes.push_back({.kind = kindOf(change.kind), .surface = pluggedSurface(change.surface)});
     }
     return changes;
 }
