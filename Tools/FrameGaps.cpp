@@ -16,10 +16,9 @@ bool FrameGaps::see(std::span<const std::uint8_t> report) noexcept {
     if (!before || image->frameNumber == *before + 1U) {
         return false;
     }
-    constexpr std::uint32_t kHalf = 0x8000'0000U;
     const std::uint32_t missing = image->frameNumber - *before - 1U;
     gaps_.fetch_add(1);
-    if (missing < kHalf) {
+    if (missing <= kMostLost) {
         framesLost_.fetch_add(missing);
     }
     return true;

@@ -410,6 +410,46 @@ TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
     EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(300U));
 }
 
+TEST_F(DaemonTest, WhatWasSetSinceASurfaceIsBackOutlivesWhatWasUnderWay) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    auto surface = playedSurface("7", example("taps"));
+    const auto gated = std::make_shared<GatedDevice>(surface.open());
+    surface.open = [gated] { return gated; };
+    daemon->source.plug(surface);
+    waitForState(1, "running");
+    Bus caller(bus->address());
+    BusMessage get = caller.call(BusNames::kService, first, BusNames::kDevice, "Get");
+    get.string("FirmwareVersion");
+    ASSERT_TRUE(caller.send(get));
+    BusMessage set = caller.call(BusNames::kService, first, BusNames::kDevice, "Set");
+    set.string(kHoldTimeout).value(300);
+    ASSERT_TRUE(caller.send(set));
+    // Both have been asked for when the one behind them is answered.
+    static_cast<void>(caller.ask(caller.call(BusNames::kService, BusNames::kManagerPath,
+                                             BusNames::kManager, "ListDevices")));
+    gated->asked.acquire();
+    const auto waitForInstances = [&](std::size_t wanted) {
+        std::size_t there = 0;
+        do {
+            daemon->call([&](Tools::Daemon::Daemon& under) { there = under.instances(); });
+        } while (there != wanted);
+    };
+    daemon->source.unplug("7");
+    daemon->source.plug(playedSurface("7", example("taps")));
+    waitForState(2, "running");
+    client->set(BusNames::devicePath(2), kHoldTimeout, 400);
+    daemon->source.unplug("7");
+    while (!client->devices().empty()) {
+    }
+    waitForInstances(1);
+    gated->allowed.release(kAll);
+    waitForInstances(0);
+    daemon->source.plug(playedSurface("7", example("taps")));
+    waitForState(3, "running");
+    EXPECT_EQ(client->get(BusNames::devicePath(3), kHoldTimeout), PropertyValue(400U));
+}
+
 TEST_F(DaemonTest, TheEndWaitsForNoMoreThanTheRequestThatIsUnderWay) {
     daemon.emplace(bus->address());
     client.emplace(bus->address());
@@ -480,6 +520,61 @@ TEST_F(DaemonTest, WhatWasSentJustBeforeTheUnplugIsTaken) {
     }
     allowed.set_value();
     EXPECT_TRUE(device->waitUntilHandled(kReports));
+}
+
+/// Writes down what it is told.
+class Witness final : public Tools::Daemon::EventListener {
+public:
+    struct Notes {
+        std::promise<void> unplugged;
+        std::promise<void> gone;
+        std::atomic<int> events = 0;
+        std::atomic<int> eventsAtUnplug = 0;
+    };
+
+    explicit Witness(Notes& notes) : notes_(notes) {}
+
+    void handle(const Vexa::HidEvent&) noexcept override { ++notes_.events; }
+    void surfaceUnplugged() noexcept override {
+        notes_.eventsAtUnplug = notes_.events.load();
+        notes_.unplugged.set_value();
+    }
+    void surfaceGone() noexcept override { notes_.gone.set_value(); }
+
+private:
+    Notes& notes_;
+};
+
+TEST_F(DaemonTest, TheUnplugIsToldBeforeTheLastReportsAndTheirGesturesComeAllTheSame) {
+    Witness::Notes notes;
+    daemon.emplace(bus->address(), DaemonUnderTest::rightsOfThisUser(),
+                   [&] { return std::make_unique<Witness>(notes); });
+    client.emplace(bus->address());
+    const auto device = std::make_shared<Vexa::ScriptedDevice>();
+    std::promise<void> held;
+    std::promise<void> allowed;
+    device->setHook([&, isFirst = true](std::string_view operation) mutable {
+        if (operation == Vexa::ScriptedDevice::kReportHandled && std::exchange(isFirst, false)) {
+            held.set_value();
+            allowed.get_future().get();
+        }
+    });
+    auto surface = playedSurface("7", example("taps"));
+    surface.open = [device] { return std::make_shared<Tools::Daemon::LiveDevice>(device); };
+    daemon->source.plug(surface);
+    waitForState(1, "running");
+    ASSERT_TRUE(device->sendReport(std::vector<std::uint8_t>{9}));
+    held.get_future().get();
+    std::vector<std::uint8_t> reset(10);
+    reset[0] = 2;
+    ASSERT_TRUE(device->sendReport(reset));
+    device->unplug();
+    daemon->source.unplug("7");
+    notes.unplugged.get_future().get();
+    EXPECT_EQ(notes.eventsAtUnplug, 0);
+    allowed.set_value();
+    notes.gone.get_future().get();
+    EXPECT_EQ(notes.events, 1);
 }
 
 TEST_F(DaemonTest, ASurfaceThatCannotBeOpenedSaysWhy) {

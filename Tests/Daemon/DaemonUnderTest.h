@@ -97,11 +97,15 @@ inline std::string example(const std::string& name) {
 /// The daemon on a thread of this process, and its source.
 class DaemonUnderTest {
 public:
+    using Listener = std::function<std::unique_ptr<Tools::Daemon::EventListener>()>;
+
     explicit DaemonUnderTest(const std::string& bus,
-                             Tools::Daemon::RightsPolicy rights = rightsOfThisUser())
+                             Tools::Daemon::RightsPolicy rights = rightsOfThisUser(),
+                             Listener listener = {})
         : library_(VEXATOUCH_PLUGIN_FILE) {
         std::promise<void> ready;
-        thread_ = std::thread([this, bus, rights, &ready] { serve(bus, rights, ready); });
+        thread_ = std::thread([this, bus, options = Tools::Daemon::DaemonOptions{rights, listener},
+                               &ready] { serve(bus, options, ready); });
         ready.get_future().get();
     }
     ~DaemonUnderTest() { stop(); }
@@ -150,11 +154,11 @@ public:
     [[nodiscard]] std::string log() const { return log_.str(); }
 
 private:
-    void serve(const std::string& address, const Tools::Daemon::RightsPolicy& rights,
+    void serve(const std::string& address, const Tools::Daemon::DaemonOptions& options,
                std::promise<void>& ready) {
         Tools::Daemon::Bus bus(address);
         bus.attach(loop_, [this] { loop_.stop(); });
-        Tools::Daemon::Daemon daemon(loop_, bus, library_, source, {.rights = rights}, log_);
+        Tools::Daemon::Daemon daemon(loop_, bus, library_, source, options, log_);
         daemon_ = &daemon;
         const Tools::Daemon::Watchdog watchdog(loop_, daemon, [] {});
         ready.set_value();

@@ -153,7 +153,7 @@ protected:
     [[nodiscard]] std::uint64_t reports() {
         return client->statistics(first).member("Reports").toUnsigned64();
     }
-    /// "VmRSS" or "VmHWM" of the daemon, in KiB.
+    /// "VmRSS", "VmHWM" or "VmData" of the daemon, in KiB.
     [[nodiscard]] std::size_t memory(const std::string& name) const {
         std::ifstream status("/proc/" + std::to_string(daemon->process()) + "/status");
         for (std::string line; std::getline(status, line);) {
@@ -246,6 +246,32 @@ TEST_F(HostileProgramTest, WhoTakesNoAnswersCostsNoMemory) {
         static_cast<void>(hostile.send(call(hostile, "GetStatistics")));
     }
     expectNoHarm(64);
+}
+
+TEST_F(HostileProgramTest, StreamsThatAreOverTakeNoMemory) {
+    serve(kEndless);
+    const auto streams = [this] {
+        return client->statistics(first).member("RecordStreams").toUnsigned64();
+    };
+    // Whatever the first one of all takes. A ring that is not used yet is mapped and not resident.
+    static_cast<void>(client->recordStream(first));
+    while (streams() > 0) {
+    }
+    const std::size_t before = memory("VmData");
+    {
+        std::vector<Tools::FileDescriptor> readers;
+        for (std::size_t i = 0; i < Tools::Daemon::RecordStreams::kMost; ++i) {
+            readers.push_back(client->recordStream(first));
+        }
+        if (VEXA_SANITIZED == 0) {
+            EXPECT_GT(memory("VmData"), before + 1024);
+        }
+    }
+    while (streams() > 0) {
+    }
+    if (VEXA_SANITIZED == 0) {
+        EXPECT_LT(memory("VmData"), before + 1024);
+    }
 }
 
 TEST_F(HostileProgramTest, WhoNeverReadsTheirSignalsIsTheBusesAffair) {

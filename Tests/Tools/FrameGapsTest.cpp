@@ -47,6 +47,12 @@ TEST(FrameGapsTest, ANumberThatGoesBackIsAGapWithoutALoss) {
     EXPECT_EQ(gapsAndLost({500, 500}), Counts(1, 0));
 }
 
+TEST(FrameGapsTest, ANumberThatJumpsFarAheadIsAGapWithoutALoss) {
+    EXPECT_EQ(gapsAndLost({1, 1'000'002}), Counts(1, 1'000'000));
+    EXPECT_EQ(gapsAndLost({1, 1'000'003, 1'000'004}), Counts(1, 0));
+    EXPECT_EQ(gapsAndLost({0, 0x7FFFFFFF}), Counts(1, 0));
+}
+
 TEST(FrameGapsTest, WhatIsNoImageIsPassedOver) {
     FrameGaps gaps;
     EXPECT_FALSE(gaps.see(image(1)));

@@ -13,7 +13,8 @@ namespace VexaTouch::Tools::Daemon {
 struct Daemon::Device {
     unsigned number = 0;
     bool plugged = true;
-    Settings settings;  // as they were when it was unplugged
+    Settings settings;         // as they were when it was unplugged
+    bool hasComeBack = false;  // another one has taken over
     std::unique_ptr<EventListener> listener;
     std::unique_ptr<SurfaceInstance> instance;
     std::unique_ptr<DeviceObject> object;
@@ -67,6 +68,9 @@ void Daemon::takeChanges() {
 }
 
 void Daemon::add(PluggedSurface surface) {
+    for (const auto& before : devices_) {
+        before->hasComeBack |= before->instance->surface().key() == surface.key();
+    }
     Settings settings;
     if (const auto found = remembered_.find(surface.key()); found != remembered_.end()) {
         settings = found->second;
@@ -117,6 +121,9 @@ void Daemon::stateChanged(Device& device) {
 void Daemon::remove(const std::string& id) {
     if (Device* device = find(id)) {
         log_ << device->title() << ": unplugged" << std::endl;
+        if (device->listener) {
+            device->listener->surfaceUnplugged();
+        }
         takeDown(*device, true);
     }
 }
@@ -154,8 +161,9 @@ void Daemon::taken(Device& device) {
              << counts.images + counts.framesLost << " frames were lost at " << counts.gaps
              << " place(s)" << std::endl;
     }
-    // What was asked for before the unplug and taken only afterwards is in force as well.
-    if (device.instance->settings() != device.settings) {
+    // What was asked for before the unplug and taken only afterwards is in force as well, unless
+    // the surface was back before: then what was set since is.
+    if (!device.hasComeBack && device.instance->settings() != device.settings) {
         remember(device.instance->surface().key(), device.instance->settings());
     }
     if (device.listener) {

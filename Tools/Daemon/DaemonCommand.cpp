@@ -86,6 +86,9 @@ public:
         : keys_(map, keyboard) {}
 
     void handle(const Vexa::HidEvent& event) noexcept override { keys_.handle(event); }
+    // A key that is held must not go on while last reports are waited for; their gestures press
+    // anew.
+    void surfaceUnplugged() noexcept override { keys_.releaseAll(); }
     void surfaceGone() noexcept override { keys_.releaseAll(); }
 
 private:
@@ -115,9 +118,10 @@ std::unique_ptr<Daemon::DeviceSource> makeSource(const Arguments& arguments, Str
 std::string statusText(const Daemon::Daemon& daemon) {
     const std::size_t surfaces = daemon.surfaces();
     const std::uint64_t framesLost = daemon.framesLost();
-    const std::string lost = framesLost > 0 ? ", " + std::to_string(framesLost) + " lost" : "";
+    const std::string lost =
+        framesLost > 0 ? ", " + std::to_string(framesLost) + " frames lost" : "";
     return std::to_string(surfaces) + (surfaces == 1 ? " surface, " : " surfaces, ") +
-           std::to_string(daemon.reports()) + " frames" + lost;
+           std::to_string(daemon.reports()) + " reports" + lost;
 }
 
 /// What a large message took goes back to the system at once. Left alone, the C library keeps more

@@ -67,8 +67,8 @@ struct SurfaceInstance::Parts {
     std::shared_ptr<InputTap> tap;
     std::optional<Vexa::DeviceRegistration> registration;
     std::unique_ptr<Host::HostSession> session;
-    Settings defaults;  // of what was written since
-    std::vector<std::shared_ptr<FrameFeed>> feeds;
+    Settings defaults;                            // of what was written since
+    std::vector<std::weak_ptr<FrameFeed>> feeds;  // those that the tap fills have an owner there
 };
 
 SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& library,
@@ -145,7 +145,9 @@ void SurfaceInstance::end(bool isUnplugged, std::function<void()> done) {
         parts_->session.reset();
         parts_->registration.reset();
         for (const auto& feed : parts_->feeds) {
-            parts_->tap->remove(feed);
+            if (const auto open = feed.lock()) {
+                parts_->tap->remove(open);
+            }
         }
         loop_.post(std::move(done));
     });
@@ -352,8 +354,7 @@ void SurfaceInstance::addFeed(
     ask<std::shared_ptr<InputTap>>(
         {.caller = caller},
         [feed](Parts& parts) {
-            // Those that nobody reads any more are only ours.
-            std::erase_if(parts.feeds, [](const auto& each) { return each.use_count() == 1; });
+            std::erase_if(parts.feeds, [](const auto& each) { return each.expired(); });
             parts.feeds.push_back(feed);
             parts.tap->add(feed, *parts.session);
             return parts.tap;
