@@ -540,32 +540,45 @@ struct ExpectTraced {
     }
 };
 
-TEST_F(ReplayCommandTest, EveryTracedFieldReadsBackToTheStateOfItsFrame) {
-    for (const std::string threshold : {"200.0", "0", "-3.7", "1e-40", "1e39"}) {
-        const std::string setting = "ActivationThreshold=" + threshold;
-        const std::vector<PropertyValue> lines =
-            traceOf(replay({session, "--trace", "-", "--set", setting}).out);
-        const std::vector<Tools::Setting> settings = {Tools::parseSetting(setting)};
-        Tools::Replay played(mixedSession().frames(), {.list = settings});
-        for (const PropertyValue& line : lines) {
-            ASSERT_TRUE(played.canContinue());
-            played.next();
-            const Algs& algs = played.algs();
-            for (std::size_t i = 0; i < kPixelCount; ++i) {
-                forEachPixelField(algs.touchPixels()[i],
-                                  ExpectTraced{element(line.member("pixels"), i)});
-            }
-            for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
-                forEachPixelField(algs.virtualPixels()[i],
-                                  ExpectTraced{element(line.member("virtual"), i)});
-            }
-            forEachHandStatsField(algs.handStats(), ExpectTraced{line.member("hand")});
-            EXPECT_EQ(line.member("stats"), algs.eventStats().statsDictionary());
-            EXPECT_EQ(line.member("lastDispatchedPhase"),
-                      PropertyValue(algs.lastDispatchedPhase()));
+/// The lines of a trace, held to the states of a replay of the frames.
+void expectTraced(const std::vector<PropertyValue>& lines, const FrameList& frames,
+                  const std::vector<Tools::Setting>& settings) {
+    Tools::Replay played(frames, {.list = settings});
+    for (const PropertyValue& line : lines) {
+        ASSERT_TRUE(played.canContinue());
+        played.next();
+        const Algs& algs = played.algs();
+        for (std::size_t i = 0; i < kPixelCount; ++i) {
+            forEachPixelField(algs.touchPixels()[i],
+                              ExpectTraced{element(line.member("pixels"), i)});
         }
-        EXPECT_FALSE(played.canContinue());
+        for (std::size_t i = 0; i < kVirtualPixelCount; ++i) {
+            forEachPixelField(algs.virtualPixels()[i],
+                              ExpectTraced{element(line.member("virtual"), i)});
+        }
+        forEachHandStatsField(algs.handStats(), ExpectTraced{line.member("hand")});
+        EXPECT_EQ(line.member("stats"), algs.eventStats().statsDictionary());
+        EXPECT_EQ(line.member("lastDispatchedPhase"), PropertyValue(algs.lastDispatchedPhase()));
     }
+    EXPECT_FALSE(played.canContinue());
+}
+
+TEST_F(ReplayCommandTest, EveryTracedFieldReadsBackToTheStateOfItsFrame) {
+    for (const std::string threshold : {"200.0", "0", "-3.7", "1e-40", "3e38"}) {
+        const std::string setting = "ActivationThreshold=" + threshold;
+        expectTraced(traceOf(replay({session, "--trace", "-", "--set", setting}).out),
+                     mixedSession().frames(), {Tools::parseSetting(setting)});
+    }
+}
+
+// No setting may be beyond what a float holds, but a recording may bring one.
+TEST_F(ReplayCommandTest, FieldsThatAreNotFiniteAreTracedToo) {
+    RecordedSession recorded;
+    recorded.set("Algs.ActivationThreshold", 1e39)
+        .feel(touch("A").at(350).with("B", 150).forMs(50))
+        .feel(nothing().forMs(20));
+    const std::string file = folder.file("infinite.json", recorded.text());
+    expectTraced(traceOf(replay({file, "--trace", "-"}).out), recorded.frames(), {});
 }
 
 TEST_F(ReplayCommandTest, ATraceThatCannotBeWrittenIsAFailure) {
