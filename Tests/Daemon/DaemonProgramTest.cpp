@@ -181,7 +181,7 @@ TEST_F(DaemonProgramTest, StatsOfAnOwnDeviceAreThoseOfTheDaemon) {
     EXPECT_EQ(firstOf(own.out, "State"), PropertyValue("running"));
     const auto members = expected.asDictionary();
     ASSERT_TRUE(members);
-    EXPECT_THAT(*members, SizeIs(8));
+    EXPECT_THAT(*members, SizeIs(9));
     for (const auto& [key, value] : *members) {
         // Of the daemon's the gestures come last.
         while (firstOf(runCommand(atBus({"stats", "--json"})).out, "Statistics").member(key) !=

@@ -493,6 +493,16 @@ TEST_F(DaemonTest, TheEndWaitsForNoMoreThanTheRequestThatIsUnderWay) {
     EXPECT_EQ(answers, wanted);
 }
 
+TEST_F(DaemonTest, TheServiceCountsTheSameGaps) {
+    start(example("mixed"));
+    waitForReports(1, 1234);
+    const PropertyValue statistics = client->statistics(first);
+    EXPECT_EQ(statistics.member("Gaps"), PropertyValue(2U));
+    EXPECT_EQ(statistics.member("FramesLost"), PropertyValue(4U));
+    EXPECT_EQ(statistics.member("DisjointImageCount"), PropertyValue(2U));
+    EXPECT_TRUE(statistics.member("EventStats").asDictionary());
+}
+
 TEST_F(DaemonTest, WhatWasSentJustBeforeTheUnplugIsTaken) {
     daemon.emplace(bus->address());
     client.emplace(bus->address());

@@ -262,24 +262,23 @@ void DeviceObject::recordStream(const BusMessage& call) {
 
 void DeviceObject::getStatistics(const BusMessage& call) {
     demand(call, Right::Watch, [this, call](const Caller& caller) {
-        const auto answer = [this, call](const PropertyValue& eventStats) {
-            const PropertyValue all = statistics(eventStats);
+        const auto answer = [this, call](const PropertyValue::Dictionary& counters) {
+            const PropertyValue all = statistics(counters);
             Bus::reply(call, [&all](BusMessage& reply) { reply.dictionary(all); });
         };
         if (instance_.state() != SurfaceInstance::State::Running) {
             answer({});
             return;
         }
-        instance_.get(caller, SurfaceInstance::kEventStatsKey,
-                      [answer](const Outcome<PropertyValue>& outcome) {
-                          answer(outcome.value ? *outcome.value : PropertyValue());
-                      });
+        instance_.getCounters(caller, [answer](const Outcome<PropertyValue::Dictionary>& outcome) {
+            answer(outcome.value.value_or(PropertyValue::Dictionary()));
+        });
     });
 }
 
-PropertyValue DeviceObject::statistics(const PropertyValue& eventStats) const {
+PropertyValue DeviceObject::statistics(const PropertyValue::Dictionary& counters) const {
     PropertyValue::Dictionary all =
-        statisticsOf(instance_.counts(), instance_.gestures(), eventStats);
+        statisticsOf(instance_.counts(), instance_.gestures(), counters);
     all.emplace("GesturesDropped", dropped_);
     all.emplace("RecordStreams", std::uint64_t{streams_.count(path_)});
     all.emplace("RecordReportsLost", streams_.lost(path_));

@@ -48,7 +48,8 @@ private:
     /// Calls `granted` if the caller has the right and this object is still on the bus then.
     void demand(const BusMessage& call, Right right,
                 std::function<void(const Caller& caller)> granted);
-    [[nodiscard]] Vexa::PropertyValue statistics(const Vexa::PropertyValue& eventStats) const;
+    [[nodiscard]] Vexa::PropertyValue statistics(
+        const Vexa::PropertyValue::Dictionary& counters) const;
     void sayLost();
 
     Bus& bus_;

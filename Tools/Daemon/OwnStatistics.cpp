@@ -50,7 +50,7 @@ public:
                                                           {"Serial", surface.serial},
                                                           {"State", "running"},
                                                           {"Vendor", surface.vendor}},
-            .statistics = statisticsOf(instance_->counts(), instance_->gestures(), eventStats_)};
+            .statistics = statisticsOf(instance_->counts(), instance_->gestures(), counters_)};
     }
 
 private:
@@ -82,18 +82,19 @@ private:
         }
     }
 
-    /// Asks for the algorithm's counters, and then takes everything down.
+    /// Asks for the service's counters, and then takes everything down.
     void finish() {
         finishWanted_ = true;
         if (isEnding_ || instance_->state() != SurfaceInstance::State::Running) {
             return;
         }
         isEnding_ = true;
-        instance_->get({.right = Right::Control}, SurfaceInstance::kEventStatsKey,
-                       [this](const Outcome<Vexa::PropertyValue>& outcome) {
-                           eventStats_ = outcome.value.value_or(Vexa::PropertyValue());
-                           end();
-                       });
+        instance_->getCounters({.right = Right::Control},
+                               [this](const Outcome<Vexa::PropertyValue::Dictionary>& outcome) {
+                                   counters_ =
+                                       outcome.value.value_or(Vexa::PropertyValue::Dictionary());
+                                   end();
+                               });
     }
     void fail(const std::string& reason) {
         failure_ = failure_.empty() ? reason : failure_;
@@ -115,7 +116,7 @@ private:
     bool isEnding_ = false;
     bool isUnplugged_ = false;
     std::string failure_;
-    Vexa::PropertyValue eventStats_;
+    Vexa::PropertyValue::Dictionary counters_;
     EventLoop loop_;
     EventLoop::WatchHandle signalWatch_;
     EventLoop::WatchHandle deadline_;

@@ -46,7 +46,7 @@ void waitForLastReports(const Host::HostSession& session) {
 }  // namespace
 
 Vexa::PropertyValue::Dictionary statisticsOf(const ReportCounts& counts, std::uint64_t gestures,
-                                             const Vexa::PropertyValue& eventStats) {
+                                             const Vexa::PropertyValue::Dictionary& counters) {
     Vexa::PropertyValue::Dictionary all = {
         {"Reports", counts.reports},
         {"Images", counts.images},
@@ -56,9 +56,7 @@ Vexa::PropertyValue::Dictionary statisticsOf(const ReportCounts& counts, std::ui
         {"FramesLost", counts.framesLost},
         {"Gestures", gestures},
     };
-    if (eventStats) {
-        all.emplace("EventStats", eventStats);
-    }
+    all.insert(counters.begin(), counters.end());
     return all;
 }
 
@@ -296,6 +294,20 @@ void SurfaceInstance::get(const Caller& caller, const std::string& key,
                                key + ": there is no such property, or it has no value");
             }
             return value;
+        },
+        std::move(done));
+}
+
+void SurfaceInstance::getCounters(
+    const Caller& caller,
+    std::function<void(const Outcome<Vexa::PropertyValue::Dictionary>& outcome)> done) {
+    ask<Vexa::PropertyValue::Dictionary>(
+        {.caller = caller},
+        [](Parts& parts) {
+            return Vexa::PropertyValue::Dictionary{
+                {"DisjointImageCount", parts.session->property("DisjointImageCount")},
+                {"EventStats", parts.session->property("Pipeline.Algs.EventStats")},
+            };
         },
         std::move(done));
 }

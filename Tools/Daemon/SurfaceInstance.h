@@ -41,9 +41,10 @@ struct Outcome {
 using Settings = std::map<std::string, Vexa::PropertyValue>;
 
 /// What a surface has counted, as the daemon tells it: "Reports", "Images", "FirmwareEvents",
-/// "InvalidReports", "Gaps", "FramesLost", "Gestures", and "EventStats" if there is a value.
+/// "InvalidReports", "Gaps", "FramesLost", "Gestures", and what the service has counted, if that
+/// could be had: "DisjointImageCount" and "EventStats".
 Vexa::PropertyValue::Dictionary statisticsOf(const ReportCounts& counts, std::uint64_t gestures,
-                                             const Vexa::PropertyValue& eventStats);
+                                             const Vexa::PropertyValue::Dictionary& counters);
 
 /// Gestures in their order, and how many are missing before them.
 struct Gestures {
@@ -117,8 +118,10 @@ public:
              std::function<void(const Outcome<Vexa::PropertyValue>& outcome)> done);
     /// Writes back every setting as it was when the plug-in started, and forgets them.
     void reset(const Caller& caller, std::function<void(const Outcome<bool>& outcome)> done);
-    /// The algorithm's own counters, for statisticsOf.
-    static constexpr const char* kEventStatsKey = "Pipeline.Algs.EventStats";
+    /// What the service itself has counted, for statisticsOf.
+    void getCounters(
+        const Caller& caller,
+        std::function<void(const Outcome<Vexa::PropertyValue::Dictionary>& outcome)> done);
 
     /// Fills the feed from now on. The tap is for removing it again.
     void addFeed(const Caller& caller, const std::shared_ptr<FrameFeed>& feed,
