@@ -503,32 +503,53 @@ TEST_F(DaemonTest, TheServiceCountsTheSameGaps) {
     EXPECT_TRUE(statistics.member("EventStats").asDictionary());
 }
 
+/// A surface whose input thread is held once it has handled the first report.
+class HeldInputThread {
+public:
+    HeldInputThread() {
+        device->setHook([this, isFirst = true](std::string_view operation) mutable {
+            if (operation == Vexa::ScriptedDevice::kReportHandled &&
+                std::exchange(isFirst, false)) {
+                held_.set_value();
+                allowed_.get_future().get();
+            }
+        });
+    }
+
+    [[nodiscard]] Tools::Daemon::PluggedSurface surface() const {
+        auto plugged = playedSurface("7", example("taps"));
+        plugged.open = [device = device] {
+            return std::make_shared<Tools::Daemon::LiveDevice>(device);
+        };
+        return plugged;
+    }
+    void waitUntilHeld() { held_.get_future().get(); }
+    void letGo() { allowed_.set_value(); }
+
+    const std::shared_ptr<Vexa::ScriptedDevice> device = std::make_shared<Vexa::ScriptedDevice>();
+
+private:
+    std::promise<void> held_;
+    std::promise<void> allowed_;
+};
+
 TEST_F(DaemonTest, WhatWasSentJustBeforeTheUnplugIsTaken) {
     daemon.emplace(bus->address());
     client.emplace(bus->address());
-    const auto device = std::make_shared<Vexa::ScriptedDevice>();
-    std::promise<void> held;
-    std::promise<void> allowed;
-    device->setHook([&, isFirst = true](std::string_view operation) mutable {
-        if (operation == Vexa::ScriptedDevice::kReportHandled && std::exchange(isFirst, false)) {
-            held.set_value();
-            allowed.get_future().get();
-        }
-    });
-    auto surface = playedSurface("7", example("taps"));
-    surface.open = [device] { return std::make_shared<Tools::Daemon::LiveDevice>(device); };
-    daemon->source.plug(surface);
+    HeldInputThread held;
+    const auto& device = held.device;
+    daemon->source.plug(held.surface());
     waitForState(1, "running");
     constexpr std::uint64_t kReports = 60;
     for (std::uint64_t i = 0; i < kReports; ++i) {
         ASSERT_TRUE(device->sendReport(std::vector<std::uint8_t>{9}));
     }
-    held.get_future().get();
+    held.waitUntilHeld();
     device->unplug();
     daemon->source.unplug("7");
     while (!client->devices().empty()) {
     }
-    allowed.set_value();
+    held.letGo();
     EXPECT_TRUE(device->waitUntilHandled(kReports));
 }
 
@@ -560,21 +581,12 @@ TEST_F(DaemonTest, TheUnplugIsToldBeforeTheLastReportsAndTheirGesturesComeAllThe
     daemon.emplace(bus->address(), DaemonUnderTest::rightsOfThisUser(),
                    [&] { return std::make_unique<Witness>(notes); });
     client.emplace(bus->address());
-    const auto device = std::make_shared<Vexa::ScriptedDevice>();
-    std::promise<void> held;
-    std::promise<void> allowed;
-    device->setHook([&, isFirst = true](std::string_view operation) mutable {
-        if (operation == Vexa::ScriptedDevice::kReportHandled && std::exchange(isFirst, false)) {
-            held.set_value();
-            allowed.get_future().get();
-        }
-    });
-    auto surface = playedSurface("7", example("taps"));
-    surface.open = [device] { return std::make_shared<Tools::Daemon::LiveDevice>(device); };
-    daemon->source.plug(surface);
+    HeldInputThread held;
+    const auto& device = held.device;
+    daemon->source.plug(held.surface());
     waitForState(1, "running");
     ASSERT_TRUE(device->sendReport(std::vector<std::uint8_t>{9}));
-    held.get_future().get();
+    held.waitUntilHeld();
     std::vector<std::uint8_t> reset(10);
     reset[0] = 2;
     ASSERT_TRUE(device->sendReport(reset));
@@ -582,7 +594,7 @@ TEST_F(DaemonTest, TheUnplugIsToldBeforeTheLastReportsAndTheirGesturesComeAllThe
     daemon->source.unplug("7");
     notes.unplugged.get_future().get();
     EXPECT_EQ(notes.eventsAtUnplug, 0);
-    allowed.set_value();
+    held.letGo();
     notes.gone.get_future().get();
     EXPECT_EQ(notes.events, 1);
 }

@@ -2,6 +2,7 @@
 
 #include "Shared/InputReport.h"
 #include "Tests/Daemon/DaemonUnderTest.h"
+#include "Tests/Support/Sanitized.h"
 #include "Tests/Tools/ProgramRun.h"
 #include "Tests/Tools/RecordedSession.h"
 #include "Tools/Daemon/BusNames.h"
@@ -21,17 +22,6 @@
 #include <sstream>
 #include <string>
 #include <vector>
-
-#if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__)
-#define VEXA_SANITIZED 1
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-#define VEXA_SANITIZED 1
-#endif
-#endif
-#ifndef VEXA_SANITIZED
-#define VEXA_SANITIZED 0
-#endif
 
 namespace VexaTouch::Testing {
 namespace {
@@ -171,7 +161,7 @@ protected:
         const std::uint64_t before = reports();
         while (reports() == before) {
         }
-        if (VEXA_SANITIZED == 0) {
+        if (!kSanitized) {
             EXPECT_LT(memory("VmHWM"), mostMiB * 1024);
             EXPECT_LT(memory("VmRSS"), kMostAtRestKiB);
         }
@@ -192,7 +182,7 @@ protected:
 TEST_F(HostileProgramTest, HugeKeysValuesAndMessagesAreRefusedOneByOne) {
     serve(kEndless);
     // Nearly as much as the bus takes; each takes long where every byte is checked.
-    constexpr std::size_t kHuge = std::size_t{VEXA_SANITIZED == 0 ? 30 : 2} << 20U;
+    constexpr std::size_t kHuge = std::size_t{kSanitized ? 2 : 30} << 20U;
     Bus hostile(bus->address());
     Tools::Daemon::EventLoop loop;
     std::vector<BusSlot> slots;
@@ -263,13 +253,13 @@ TEST_F(HostileProgramTest, StreamsThatAreOverTakeNoMemory) {
         for (std::size_t i = 0; i < Tools::Daemon::RecordStreams::kMost; ++i) {
             readers.push_back(client->recordStream(first));
         }
-        if (VEXA_SANITIZED == 0) {
+        if (!kSanitized) {
             EXPECT_GT(memory("VmData"), before + 1024);
         }
     }
     while (streams() > 0) {
     }
-    if (VEXA_SANITIZED == 0) {
+    if (!kSanitized) {
         EXPECT_LT(memory("VmData"), before + 1024);
     }
 }
@@ -295,7 +285,7 @@ TEST_F(HostileProgramTest, WhoNeverReadsTheirSignalsIsTheBusesAffair) {
            gesturesOf(session)) {
     }
     EXPECT_EQ(client->get(first, "Pipeline.Algs.HoldTimeoutMilliseconds"), PropertyValue(500U));
-    if (VEXA_SANITIZED == 0) {
+    if (!kSanitized) {
         EXPECT_LT(memory("VmHWM"), 64U * 1024);
     }
 }

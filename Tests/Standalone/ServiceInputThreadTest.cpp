@@ -3,6 +3,7 @@
 // The figure: a report costs the input thread one wait and one read, and a batch of events at most
 // one wake of the host's queue.
 
+#include "Tests/Support/Sanitized.h"
 #include "Tests/Support/ServiceUnderTest.h"
 #include "Tests/Support/Touch.h"
 
@@ -25,17 +26,6 @@
 #include <stdexcept>
 #include <thread>
 #include <vector>
-
-#if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__)
-#define VEXA_SANITIZED 1
-#elif defined(__has_feature)
-#if __has_feature(thread_sanitizer) || __has_feature(address_sanitizer)
-#define VEXA_SANITIZED 1
-#endif
-#endif
-#ifndef VEXA_SANITIZED
-#define VEXA_SANITIZED 0
-#endif
 
 namespace VexaTouch::Testing {
 namespace {
@@ -178,7 +168,7 @@ TEST(ServiceInputThreadTest, CallsAreOneWaitAndOneReadForEachReportAndAWakeForAB
             growths += found->second;
             span.erase(found);
         }
-        if (!VEXA_SANITIZED) {
+        if (!kSanitized) {
             EXPECT_LE(growths, kReports / 100);
             continue;
         }

@@ -3,6 +3,7 @@
 #include "Platform/Json.h"
 #include "Platform/PropertyValue.h"
 #include "Tests/Plugins/Defects.h"
+#include "Tests/Support/Sanitized.h"
 #include "Tests/Tools/CommandRun.h"
 #include "Tools/Validate/PluginCheck.h"
 
@@ -32,6 +33,7 @@ using Testing::contentOf;
 using ::testing::ElementsAreArray;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using Testing::kSanitized;
 using Testing::linesOf;
 using ::testing::MatchesRegex;
 using Testing::runCommand;
@@ -109,18 +111,6 @@ TEST(ValidateCommandTest, AWrongCommandLineIsAUsageError) {
 }
 
 #if defined(VEXATOUCH_PROGRAM) && defined(VEXATOUCH_SAMPLE_PLUGINS)
-
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-constexpr bool kSanitized = true;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-constexpr bool kSanitized = true;
-#else
-constexpr bool kSanitized = false;
-#endif
-#else
-constexpr bool kSanitized = false;
-#endif
 
 std::string sample(std::string_view name) {
     return VEXATOUCH_SAMPLE_PLUGINS "/" + std::string(name) + ".so";

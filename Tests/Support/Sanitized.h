@@ -1,0 +1,19 @@
+#pragma once
+
+namespace VexaTouch::Testing {
+
+/// Whether the program is built with the address or thread sanitizer, which has memory, locks and
+/// time of its own.
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+inline constexpr bool kSanitized = true;
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
+inline constexpr bool kSanitized = true;
+#else
+inline constexpr bool kSanitized = false;
+#endif
+#else
+inline constexpr bool kSanitized = false;
+#endif
+
+}  // namespace VexaTouch::Testing
