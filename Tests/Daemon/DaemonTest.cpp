@@ -364,17 +364,26 @@ public:
     }
 };
 
+class DaemonGatedTest : public DaemonTest {
+protected:
+    /// Starts the daemon with one such surface.
+    std::shared_ptr<GatedDevice> startGated() {
+        daemon.emplace(bus->address());
+        client.emplace(bus->address());
+        auto surface = playedSurface("7", example("taps"));
+        const auto gated = std::make_shared<GatedDevice>(surface.open());
+        surface.open = [gated] { return gated; };
+        daemon->source.plug(surface);
+        waitForState(1, "running");
+        return gated;
+    }
+};
+
 /// More than any test asks.
 constexpr int kAll = 1000;
 
-TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
-    daemon.emplace(bus->address());
-    client.emplace(bus->address());
-    auto surface = playedSurface("7", example("taps"));
-    const auto gated = std::make_shared<GatedDevice>(surface.open());
-    surface.open = [gated] { return gated; };
-    daemon->source.plug(surface);
-    waitForState(1, "running");
+TEST_F(DaemonGatedTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
+    const auto gated = startGated();
     Tools::Daemon::EventLoop loop;
     Bus caller(bus->address());
     const auto failed = [&](const BusError& error) {
@@ -410,14 +419,8 @@ TEST_F(DaemonTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
     EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(300U));
 }
 
-TEST_F(DaemonTest, WhatWasSetSinceASurfaceIsBackOutlivesWhatWasUnderWay) {
-    daemon.emplace(bus->address());
-    client.emplace(bus->address());
-    auto surface = playedSurface("7", example("taps"));
-    const auto gated = std::make_shared<GatedDevice>(surface.open());
-    surface.open = [gated] { return gated; };
-    daemon->source.plug(surface);
-    waitForState(1, "running");
+TEST_F(DaemonGatedTest, WhatWasSetSinceASurfaceIsBackOutlivesWhatWasUnderWay) {
+    const auto gated = startGated();
     Bus caller(bus->address());
     BusMessage get = caller.call(BusNames::kService, first, BusNames::kDevice, "Get");
     get.string("FirmwareVersion");
@@ -450,14 +453,8 @@ TEST_F(DaemonTest, WhatWasSetSinceASurfaceIsBackOutlivesWhatWasUnderWay) {
     EXPECT_EQ(client->get(BusNames::devicePath(3), kHoldTimeout), PropertyValue(400U));
 }
 
-TEST_F(DaemonTest, TheEndWaitsForNoMoreThanTheRequestThatIsUnderWay) {
-    daemon.emplace(bus->address());
-    client.emplace(bus->address());
-    auto surface = playedSurface("7", example("taps"));
-    const auto gated = std::make_shared<GatedDevice>(surface.open());
-    surface.open = [gated] { return gated; };
-    daemon->source.plug(surface);
-    waitForState(1, "running");
+TEST_F(DaemonGatedTest, TheEndWaitsForNoMoreThanTheRequestThatIsUnderWay) {
+    const auto gated = startGated();
     constexpr std::size_t kCalls = 6;
     Bus caller(bus->address());
     Tools::Daemon::EventLoop loop;
