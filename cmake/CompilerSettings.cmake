@@ -27,10 +27,6 @@ set(CMAKE_C_STANDARD_REQUIRED ON)
 set(CMAKE_C_EXTENSIONS OFF)
 
 add_compile_options(-Wall -Wextra -Wpedantic -Wshadow -Wconversion)
-if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_LESS 13)
-    # It warns of overlaps inside the library's own string concatenation, wrongly.
-    add_compile_options(-Wno-restrict)
-endif()
 if(CMAKE_CXX_COMPILER_ID MATCHES "Clang")
     add_compile_options(-Wthread-safety)
 endif()
@@ -42,6 +38,13 @@ if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU" AND CMAKE_CXX_COMPILER_VERSION VERSION_L
 endif()
 if(VEXA_WERROR)
     add_compile_options(-Werror)
+endif()
+
+if(CMAKE_BUILD_TYPE STREQUAL "Release")
+    # As Debian hardens its programs. What is measured and tested is what is packaged.
+    add_compile_options(-fstack-protector-strong -fstack-clash-protection)
+    add_compile_definitions(_FORTIFY_SOURCE=2)
+    add_link_options(-Wl,-z,relro,-z,now)
 endif()
 
 if(VEXA_SANITIZE)

@@ -118,7 +118,7 @@ private:
         // The node may have run and be gone by now; the queue is not: whoever pushes holds it. Not
         // only who found the stack empty wakes the thread: that one may be slow to come here.
         const std::uint64_t one = 1;
-        static_cast<void>(::write(wake_.number(), &one, sizeof one));
+        static_cast<void>(::write(wake_.number(), &one, sizeof one) == sizeof one);
     }
 
     void work() noexcept {

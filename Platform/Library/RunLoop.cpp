@@ -379,12 +379,12 @@ void vexa_run_loop::wake() noexcept {
     // The loop's own thread is not waiting.
     if (OfThread::get() == this || signalled_.exchange(true)) return;
     const std::uint64_t one = 1;
-    static_cast<void>(::write(wake_.number(), &one, sizeof one));
+    static_cast<void>(::write(wake_.number(), &one, sizeof one) == sizeof one);
 }
 
 void vexa_run_loop::takeSignal() noexcept {
     std::uint64_t count = 0;
-    static_cast<void>(::read(wake_.number(), &count, sizeof count));
+    static_cast<void>(::read(wake_.number(), &count, sizeof count) == sizeof count);
     // In this order: who submits after the exchange writes again, who did before is seen.
     signalled_.exchange(false);
 }
