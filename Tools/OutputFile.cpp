@@ -104,7 +104,10 @@ void OutputFile::writeThrough(std::string_view text) {
 
 void OutputFile::write(std::string_view text) {
     if (stream_ != nullptr) {
-        stream_->write(text.data(), static_cast<std::streamsize>(text.size()));
+        errno = 0;
+        if (!stream_->write(text.data(), static_cast<std::streamsize>(text.size()))) {
+            fail(errno != 0 ? errno : EIO);
+        }
         return;
     }
     if (buffer_.size() + text.size() > kBufferSize) {
@@ -120,8 +123,8 @@ void OutputFile::write(std::string_view text) {
 
 void OutputFile::commit() {
     if (stream_ != nullptr) {
-        stream_->flush();
-        if (!stream_->good()) {
+        errno = 0;
+        if (!stream_->flush()) {
             fail(errno != 0 ? errno : EIO);
         }
         return;
