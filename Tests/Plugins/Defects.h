@@ -55,7 +55,7 @@
     DEFECT(WrongRefcon, "events", "random-reports late-callback")                                 \
     DEFECT(WrongSender, "events", "random-reports")                                               \
     DEFECT(TakesLateCallback, "late-callback", "")                                                \
-    DEFECT(UnschedulesLate, "unschedule", "?unload ?late-callback")                               \
+    DEFECT(UnschedulesLate, "unschedule", "?unload ?late-callback ?memory")                              \
     DEFECT(IgnoresOpenFailure, "device-failures", "unplug")                                       \
     DEFECT(LosesDescriptorOnFailedOpen, "device-failures", "")                                    \
     DEFECT(IgnoresRefusedProperty, "device-failures", "")                                         \
