@@ -25,3 +25,10 @@ plug_in() {
     tell plug "$@"
     wait_until "the surface at $node" serves "\"$node\""
 }
+
+# Not by su: that would be a login, with a manager of services of its own.
+as() {
+    local user=$1
+    shift
+    setpriv --reuid="$user" --regid="$user" --init-groups sh -c "$*"
+}
