@@ -26,9 +26,10 @@ plug_in() {
     wait_until "the surface at $node" serves "\"$node\""
 }
 
-# Not by su: that would be a login, with a manager of services of its own.
+# Not by su: that would be a login, with a manager of services of its own. The shell has a setpriv built in,
+# which can less.
 as() {
     local user=$1
     shift
-    setpriv --reuid="$user" --regid="$user" --init-groups sh -c "$*"
+    /usr/bin/setpriv --reuid="$user" --regid="$user" --init-groups sh -c "$*"
 }
