@@ -5,8 +5,8 @@
 # the same build, nor Multi-Arch, nor constant times: finish-packages.bash sees to these afterwards.
 set(VEXA_DEBIAN "${PROJECT_SOURCE_DIR}/data/debian")
 set(VEXA_DEBIAN_MADE "${PROJECT_BINARY_DIR}/debian")
-# Built for Debian 12: what is built for a later one is newer.
-set(VEXA_DEBIAN_REVISION "1~deb12")
+include(DebianVersion)
+vexa_debian_revision("${PROJECT_SOURCE_DIR}" "${PROJECT_VERSION}" VEXA_DEBIAN_REVISION)
 set(VEXA_DEBIAN_VERSION "${PROJECT_VERSION}-${VEXA_DEBIAN_REVISION}")
 set(VEXA_MAINTAINER "Vexa Touch maintainers <maintainers@vexatouch.org>")
 
@@ -14,8 +14,7 @@ set(VEXA_MAINTAINER "Vexa Touch maintainers <maintainers@vexatouch.org>")
 if(DEFINED ENV{SOURCE_DATE_EPOCH})
     set(VEXA_EPOCH "$ENV{SOURCE_DATE_EPOCH}")
 else()
-    execute_process(COMMAND git log -1 --format=%ct WORKING_DIRECTORY "${PROJECT_SOURCE_DIR}"
-                    OUTPUT_VARIABLE VEXA_EPOCH OUTPUT_STRIP_TRAILING_WHITESPACE ERROR_QUIET)
+    vexa_commit("${PROJECT_SOURCE_DIR}" VEXA_EPOCH log -1 --format=%ct)
     if(NOT VEXA_EPOCH)
         file(TIMESTAMP "${PROJECT_SOURCE_DIR}/CHANGELOG.md" VEXA_EPOCH "%s" UTC)
     endif()
