@@ -3,11 +3,11 @@
 
 folder=$(mktemp -d)
 cd "$folder"
-surface= node=
+surface= node= other= other_node=
 trap 'ended $?' EXIT
 
 ended() {
-    [ "$1" -eq 0 ] || [ "$1" -eq 77 ] || tail -n 8 -v ./*.log status faults 2>/dev/null
+    [ "$1" -eq 0 ] || [ "$1" -eq 77 ] || tail -n 8 -v ./*.log status faults other-faults 2>/dev/null
     kill $(jobs -p) 2>/dev/null || true
 }
 
@@ -66,6 +66,39 @@ read_keys() {
     read -r -t 30 line <&9 || fail "no reader of keys"
     case $line in reading*) ;; *) fail "$line" ;; esac
 }
+
+# kernel_tests FILTER: those tests of KernelTests, of which there is one at least.
+kernel_tests() {
+    KernelTests --gtest_filter="$1" --gtest_brief=1 >tests 2>&1 || {
+        cat tests
+        fail "the tests $1"
+    }
+    grep -q '^\[  PASSED  \] [1-9]' tests || fail "no test is called $1: $(cat tests)"
+}
+
+# another COMMAND...: as tell, to a second surface; its node goes to "other_node".
+another() {
+    if [ -z "$other" ]; then
+        mkfifo other-commands other-answering
+        UhidSurface <other-commands >other-answering 2>other-faults &
+        other=$!
+        exec 5>other-commands 6<other-answering
+    fi
+    echo "$*" >&5
+    read -r -t 30 answer <&6 || fail "$*: $(cat other-faults)"
+    case $answer in node*) other_node=${answer#node } ;; esac
+}
+
+# start_daemon [OPTION...]: on that bus; what it says goes to daemon.log. It has said that it is ready.
+start_daemon() {
+    vexatouch daemon "$@" 2>daemon.log &
+    daemon=$!
+    wait_until "the daemon" serves '^\['
+}
+serves() { vexatouch stats --json 2>/dev/null | grep -q -- "$1"; }
+# is_running N, is_taken_down N: the daemon has said so of its surface N.
+is_running() { has_line daemon.log "^surface $1, .*: running"; }
+is_taken_down() { has_line daemon.log "^surface $1, .*: unplugged"; }
 
 # The system bus, as Debian configures it, with the policies that are installed.
 start_bus() {
