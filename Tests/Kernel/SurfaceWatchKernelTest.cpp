@@ -2,6 +2,7 @@
 
 #include "Host/SurfaceWatch.h"
 #include "Tests/Kernel/KernelSurface.h"
+#include "Tests/Support/LiveObjects.h"
 
 #include <gmock/gmock.h>
 #include <poll.h>
@@ -9,6 +10,7 @@
 #include <filesystem>
 #include <iterator>
 #include <optional>
+#include <thread>
 
 namespace VexaTouch::Testing {
 namespace {
@@ -51,9 +53,20 @@ std::optional<SurfaceChange> nextChange(SurfaceWatch& watch) {
     return ::testing::AssertionSuccess();
 }
 
-std::size_t openDescriptors() {
-    const std::filesystem::directory_iterator entries("/proc/self/fd");
+std::size_t entriesOf(const char* folder) {
+    const std::filesystem::directory_iterator entries(folder);
     return static_cast<std::size_t>(std::distance(begin(entries), end(entries)));
+}
+
+/// Waits until this process has no more threads than that; false after the limit. A session's last
+/// one may still be in its last instructions when the session has ended.
+bool hasNoMoreThreadsThan(std::size_t threads) {
+    const auto end = std::chrono::steady_clock::now() + kLimit;
+    while (entriesOf("/proc/self/task") > threads) {
+        if (std::chrono::steady_clock::now() >= end) return false;
+        std::this_thread::sleep_for(std::chrono::milliseconds(1));
+    }
+    return true;
 }
 
 TEST(SurfaceWatchKernelTest, UdevTellsWhereItRuns) {
@@ -78,25 +91,34 @@ TEST(SurfaceWatchKernelTest, SurfaceThatIsThereIsFoundByItsDescriptor) {
     EXPECT_THAT(Host::findSurfaces(named), SizeIs(2));
 }
 
+void plugCycle(SurfaceWatch& watch, const std::string& serial) {
+    auto surface = std::make_unique<UhidDevice>(UhidDevice::Identity{.serial = serial});
+    const auto added = nextChange(watch);
+    ASSERT_TRUE(isChange(added, SurfaceChange::Kind::Added, serial)) << serial;
+    KernelSession session(
+        std::make_shared<Vexa::HidrawDevice>(added->surface.node, added->surface.sysPath));
+    session->begin();
+    surface->send(kReset);
+    ASSERT_TRUE(session.events.waitUntil(1)) << serial;
+    surface.reset();
+    ASSERT_TRUE(isChange(nextChange(watch), SurfaceChange::Kind::Removed, serial)) << serial;
+    session->end();
+}
+
 TEST(SurfaceWatchKernelTest, HundredPlugCyclesLeaveNothingBehind) {
     SurfaceWatch watch({});
     EXPECT_THAT(watch.takeChanges(), IsEmpty());
-    const std::size_t descriptors = openDescriptors();
+    // The first one loads and starts what stays.
+    ASSERT_NO_FATAL_FAILURE(plugCycle(watch, "warm-up"));
+    const std::size_t descriptors = entriesOf("/proc/self/fd");
+    const std::size_t threads = entriesOf("/proc/self/task");
+    const LiveObjects objects = LiveObjects::now();
     for (int cycle = 0; cycle < 100; ++cycle) {
-        const std::string serial = "cycle " + std::to_string(cycle);
-        auto surface = std::make_unique<UhidDevice>(UhidDevice::Identity{.serial = serial});
-        const auto added = nextChange(watch);
-        ASSERT_TRUE(isChange(added, SurfaceChange::Kind::Added, serial)) << serial;
-        KernelSession session(
-            std::make_shared<Vexa::HidrawDevice>(added->surface.node, added->surface.sysPath));
-        session->begin();
-        surface->send(kReset);
-        ASSERT_TRUE(session.events.waitUntil(1)) << serial;
-        surface.reset();
-        ASSERT_TRUE(isChange(nextChange(watch), SurfaceChange::Kind::Removed, serial)) << serial;
-        session->end();
+        ASSERT_NO_FATAL_FAILURE(plugCycle(watch, "cycle " + std::to_string(cycle)));
     }
-    EXPECT_EQ(openDescriptors(), descriptors);
+    EXPECT_TRUE(hasNoMoreThreadsThan(threads)) << threads << " before";
+    EXPECT_EQ(entriesOf("/proc/self/fd"), descriptors);
+    EXPECT_EQ(LiveObjects::now(), objects);
 }
 
 TEST(SurfaceWatchKernelTest, DescriptorThatChangedAtTheReplugIsLookedAtAnew) {

@@ -5,6 +5,7 @@
 #include "Tests/Support/LiveObjects.h"
 
 #include <algorithm>
+#include <future>
 
 namespace VexaTouch::Testing {
 namespace {
@@ -62,6 +63,11 @@ TEST_P(UnplugKernelTest, EveryStepReturnsAndTheNextSurfaceWorks) {
             EXPECT_TRUE(session.events.waitUntil(1));
         }
         unplugAt("after a report");
+        // Both go to the device itself, which no longer has anything once it is gone.
+        const PropertyValue serial = session->property("SerialNumber");
+        EXPECT_EQ(static_cast<bool>(serial), surface_ != nullptr);
+        const bool isSet = session->setProperty("Colour", "green");
+        EXPECT_EQ(isSet, surface_ != nullptr);
         const PropertyValue answer = session->property("CriticalErrors");
         EXPECT_EQ(static_cast<bool>(answer), GetParam().answers);
         if (begun) session->halt();
@@ -80,7 +86,8 @@ INSTANTIATE_TEST_SUITE_P(
     ::testing::Values(Stage{"before start", false, false}, Stage{"after start", false, false},
                       Stage{"open", false, false}, Stage{"open done", true, false},
                       Stage{"after begin", true, false}, Stage{"report done", true, false},
-                      Stage{"after a report", true, false}, Stage{"getReport", true, false},
+                      Stage{"after a report", true, false}, Stage{"property", true, false},
+                      Stage{"setProperty", true, false}, Stage{"getReport", true, false},
                       Stage{"close", true, true}, Stage{"after halt", true, true},
                       Stage{"after end", true, true}, Stage{"never", true, true}),
     [](const auto& test) {
@@ -88,6 +95,29 @@ INSTANTIATE_TEST_SUITE_P(
         std::ranges::replace(name, ' ', '_');
         return name;
     });
+
+/// A feature request waits in the kernel for the device's answer when the plug is pulled.
+TEST(PendingRequestUnplugKernelTest, RequestEndsWithoutAnAnswerAndTheNextSurfaceWorks) {
+    const LiveObjects before = LiveObjects::now();
+    {
+        auto surface = std::make_unique<UhidDevice>(UhidDevice::Identity{.serial = "unplugged"},
+                                                    UhidDevice::Features::Never);
+        const auto device = std::make_shared<Vexa::HidrawDevice>(nodeOf(*surface));
+        KernelSession session(device);
+        session->begin();
+        auto asking =
+            std::async(std::launch::async, [&] { return session->property("CriticalErrors"); });
+        ASSERT_TRUE(surface->waitUntilAsked(1, kLimit));
+        EXPECT_EQ(asking.wait_for(std::chrono::seconds(0)), std::future_status::timeout);
+        surface.reset();
+        EXPECT_EQ(asking.get(), PropertyValue());
+        session->halt();
+        session->end();
+        EXPECT_TRUE(device->isGone());
+    }
+    EXPECT_EQ(LiveObjects::now(), before);
+    expectServiceWorks();
+}
 
 }  // namespace
 }  // namespace VexaTouch::Testing
