@@ -38,15 +38,23 @@ def print_list(checks):
         print(f"{check.name:28} {check.about}")
 
 
-def _keep_files(archive, folder):
-    """What the machine sent: the checks' logs and figures."""
+def _keep_files(archive, folder, names):
+    """What the machine sent: the logs of the checks of these names, and figures. False, and says why, when
+    they are not whole."""
     shutil.rmtree(folder, ignore_errors=True)
     folder.mkdir(parents=True)
     try:
         with tarfile.open(archive) as files:
             files.extractall(folder)
     except (tarfile.TarError, OSError) as fault:
-        print(f"the files of the machine are not whole: {fault}")
+        print(f"FAILED   the files of the machine are not whole: {fault}")
+        return False
+    # One that is cut off between two files reads well.
+    for name in names:
+        if not (folder / f"{name}.log").exists():
+            print(f"FAILED   the files of the machine are not whole: {name}.log is missing")
+            return False
+    return True
 
 
 def run_checks(checks, limit, work, kernel, initramfs, clock, **options):
@@ -74,7 +82,8 @@ def run_checks(checks, limit, work, kernel, initramfs, clock, **options):
         flush=True,
     )
     (work / "console").write_text("\n".join(machine.console) + "\n")
-    _keep_files(machine.files, work / "out")
+    if not _keep_files(machine.files, work / "out", about):
+        counts["FAILED"] += 1
     ended = {virtual_machine.ALL_PASSED: 0, virtual_machine.SOME_FAILED: 1}
     if status in ended and not missing:
         if counts["FAILED"]:
