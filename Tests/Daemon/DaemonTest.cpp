@@ -550,6 +550,45 @@ TEST_F(DaemonTest, WhatWasSentJustBeforeTheUnplugIsTaken) {
     EXPECT_TRUE(device->waitUntilHandled(kReports));
 }
 
+/// A device that tells on which thread it is closed for good.
+class ClosedSomewhere final : public Tools::ForwardingDevice {
+public:
+    ClosedSomewhere(std::shared_ptr<Vexa::DeviceBackend> device,
+                    std::promise<std::thread::id>& closed) noexcept
+        : ForwardingDevice(std::move(device)), closed_(closed) {}
+    ~ClosedSomewhere() override { closed_.set_value(std::this_thread::get_id()); }
+    ClosedSomewhere(const ClosedSomewhere&) = delete;
+    ClosedSomewhere(ClosedSomewhere&&) = delete;
+    ClosedSomewhere& operator=(const ClosedSomewhere&) = delete;
+    ClosedSomewhere& operator=(ClosedSomewhere&&) = delete;
+
+private:
+    std::promise<std::thread::id>& closed_;
+};
+
+/// The kernel lets nobody close a node while a feature request of any other is pending.
+TEST_F(DaemonTest, TheLoopClosesNoDeviceItself) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    std::thread::id loop;
+    daemon->call([&](Tools::Daemon::Daemon&) { loop = std::this_thread::get_id(); });
+    for (const bool opens : {true, false}) {
+        auto surface = playedSurface("7", example("taps"));
+        std::promise<std::thread::id> closed;
+        surface.open = [opens, &closed, open = surface.open] {
+            auto device = std::make_shared<ClosedSomewhere>(open(), closed);
+            if (!opens) {
+                throw Failure("gone again");
+            }
+            return device;
+        };
+        daemon->source.plug(surface);
+        waitForState(opens ? 1 : 2, opens ? "running" : "failed");
+        daemon->source.unplug("7");
+        EXPECT_NE(closed.get_future().get(), loop);
+    }
+}
+
 /// Writes down what it is told.
 class Witness final : public Tools::Daemon::EventListener {
 public:

@@ -124,6 +124,26 @@ TEST_F(WatchdogTest, ASurfaceThatAnswersDoesNotSpeakForOneThatIsStuck) {
     manager->heardUntil("WATCHDOG=1");
 }
 
+TEST_F(WatchdogTest, AnUnplugBetweenTwoPingsHidesNoThreadThatIsStuck) {
+    daemon.reset();
+    // The surface is unplugged before anybody is asked for the first time.
+    manager.emplace(folder.path("late"), "600000000");
+    daemon.emplace(bus->address());
+    const auto device = plugAndHold("7");
+    daemon->source.unplug("7");
+    Tools::Daemon::DaemonClient client(bus->address());
+    while (!client.devices().empty()) {
+    }
+    std::promise<void> answered;
+    auto answer = answered.get_future();
+    daemon->call([&](Tools::Daemon::Daemon& under) { under.ping([&] { answered.set_value(); }); });
+    // What was posted by then has been taken.
+    daemon->call([](Tools::Daemon::Daemon&) {});
+    EXPECT_EQ(answer.wait_for(std::chrono::seconds(0)), std::future_status::timeout);
+    device->release();
+    answer.get();
+}
+
 TEST_F(WatchdogTest, WithoutAManagerThatWantsItNothingWakes) {
     daemon.reset();
     manager.reset();

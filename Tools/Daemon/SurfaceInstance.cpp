@@ -101,16 +101,17 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
                 });
             }
             parts_->session->begin();
+            const Vexa::MutexLock guard(deviceLock_);
+            device_ = std::move(device);
         } catch (const std::exception& error) {
             reason = error.what();
             parts_->session.reset();
             parts_->registration.reset();
             device.reset();
         }
-        loop_.post([this, reason, device] {
-            device_ = device;
+        loop_.post([this, reason] {
             if (state_ == State::Starting) {
-                setState(device ? State::Running : State::Failed, reason);
+                setState(reason.empty() ? State::Running : State::Failed, reason);
             }
         });
     });
@@ -147,6 +148,14 @@ void SurfaceInstance::end(bool isUnplugged, std::function<void()> done) {
                 parts_->tap->remove(open);
             }
         }
+        std::shared_ptr<LoopDevice> device;
+        {
+            const Vexa::MutexLock guard(deviceLock_);
+            counted_ = device_ ? device_->counts() : ReportCounts{};
+            device = std::move(device_);
+        }
+        // A close waits for the feature requests of every surface, and the loop must not.
+        device.reset();
         loop_.post(std::move(done));
     });
 }
@@ -166,7 +175,8 @@ std::string SurfaceInstance::stateText() const {
 }
 
 ReportCounts SurfaceInstance::counts() const noexcept {
-    return device_ ? device_->counts() : ReportCounts{};
+    const Vexa::MutexLock guard(deviceLock_);
+    return device_ ? device_->counts() : counted_;
 }
 
 void SurfaceInstance::setState(State state, const std::string& reason) {
@@ -378,7 +388,8 @@ void SurfaceInstance::ping(std::function<void()> answered) {
     // Its end is the answer, so that a thread that has ended in order does not owe one.
     const std::shared_ptr<void> token(
         nullptr, [&loop = loop_, answered = std::move(answered)](void*) { loop.post(answered); });
-    if (state_ == State::Running && device_) {
+    const Vexa::MutexLock guard(deviceLock_);
+    if (device_) {
         device_->submit([token]() noexcept {});
     }
 }

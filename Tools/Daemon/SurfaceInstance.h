@@ -106,7 +106,7 @@ public:
     [[nodiscard]] const PluggedSurface& surface() const noexcept { return surface_; }
     /// Those that were written and are in force.
     [[nodiscard]] const Settings& settings() const noexcept { return settings_; }
-    [[nodiscard]] ReportCounts counts() const noexcept;
+    [[nodiscard]] ReportCounts counts() const noexcept EXCLUDES(deviceLock_);
     [[nodiscard]] std::uint64_t gestures() const noexcept { return gestures_; }
 
     // Each throws BusError (NotRunning, Busy) or calls back later.
@@ -128,8 +128,8 @@ public:
                  std::function<void(const Outcome<std::shared_ptr<InputTap>>& outcome)> done);
 
     /// Calls back once the thread that takes the reports has answered, or when there is none that
-    /// could.
-    void ping(std::function<void()> answered);
+    /// could. One that is being taken down is asked as long as it has its device.
+    void ping(std::function<void()> answered) EXCLUDES(deviceLock_);
 
 private:
     struct Parts;
@@ -167,8 +167,12 @@ private:
     std::deque<std::function<void()>> held_;  // those behind it
     std::atomic<bool> ending_ = false;
     std::uint64_t gestures_ = 0;
-    std::shared_ptr<LoopDevice> device_;  // once running
-    std::unique_ptr<Parts> parts_;        // the worker's
+    // The worker gives it and takes it back; whoever else uses it does so under the lock, so that
+    // the last reference goes on the worker: closing the device may wait.
+    mutable Vexa::Mutex deviceLock_;
+    std::shared_ptr<LoopDevice> device_ GUARDED_BY(deviceLock_);
+    ReportCounts counted_ GUARDED_BY(deviceLock_);  // of one that was taken back
+    std::unique_ptr<Parts> parts_;                  // the worker's
     Vexa::Mutex lock_;
     Gestures inbox_ GUARDED_BY(lock_);
     bool inboxPosted_ GUARDED_BY(lock_) = false;
