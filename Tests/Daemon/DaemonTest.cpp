@@ -655,6 +655,58 @@ TEST_F(DaemonTest, ASurfaceThatCannotBeOpenedSaysWhy) {
     EXPECT_EQ(client->statistics(first).member("Reports"), PropertyValue(0U));
 }
 
+TEST_F(DaemonTest, ASurfaceWithoutAnInputThreadHasFailed) {
+    daemon.emplace(bus->address(),
+                   Tools::Daemon::DaemonOptions{
+                       .rights = DaemonUnderTest::rightsOfThisUser(),
+                       .times = {.patience = std::chrono::milliseconds(1)},
+                   },
+                   VEXATOUCH_SAMPLE_PLUGINS "/TakesNoReports.so");
+    client.emplace(bus->address());
+    daemon->source.plug(playedSurface("7", example("taps")));
+    waitForState(1, "failed");
+    EXPECT_THAT(client->devices().front().properties.member("Reason").asString().value_or(""),
+                HasSubstr("input thread did not start"));
+}
+
+/// A device that can tell its input thread to end.
+class EndedInputThread final : public Tools::ForwardingDevice {
+public:
+    using ForwardingDevice::ForwardingDevice;
+
+    void scheduled(const Vexa::RunLoop& loop, const char* mode) noexcept override {
+        ForwardingDevice::scheduled(loop, mode);
+        if (loop) {
+            loop_ = loop;
+        }
+    }
+    void end() { loop_.stop(); }
+
+private:
+    Vexa::RunLoop loop_;
+};
+
+TEST_F(DaemonTest, ASurfaceWhoseInputThreadEndsHasFailedAndIsTakenDown) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    auto surface = playedSurface("7", example("taps"));
+    const auto device = std::make_shared<EndedInputThread>(surface.open());
+    surface.open = [device] { return device; };
+    daemon->source.plug(surface);
+    waitForState(1, "running");
+    waitForReports(1, kReportsOfTaps);
+    device->end();
+    waitForState(1, "failed");
+    EXPECT_THAT(client->devices().front().properties.member("Reason").asString().value_or(""),
+                HasSubstr("input thread did not start or has ended"));
+    EXPECT_EQ(client->statistics(first).member("Reports"), PropertyValue(kReportsOfTaps));
+    std::promise<void> answered;
+    daemon->call([&](Tools::Daemon::Daemon& under) { under.ping([&] { answered.set_value(); }); });
+    answered.get_future().get();
+    daemon->source.touch(surface);
+    waitForState(2, "running");
+}
+
 TEST_F(DaemonTest, ASurfaceThatFailedIsBegunAnewWhenThereIsNewsOfIt) {
     daemon.emplace(bus->address());
     client.emplace(bus->address());

@@ -102,10 +102,14 @@ public:
     explicit DaemonUnderTest(const std::string& bus,
                              Tools::Daemon::RightsPolicy rights = rightsOfThisUser(),
                              Listener listener = {})
-        : library_(VEXATOUCH_PLUGIN_FILE) {
+        : DaemonUnderTest(bus, Tools::Daemon::DaemonOptions{.rights = std::move(rights),
+                                                            .listener = std::move(listener)}) {}
+    DaemonUnderTest(const std::string& bus, Tools::Daemon::DaemonOptions options,
+                    const std::string& plugin = VEXATOUCH_PLUGIN_FILE)
+        : library_(plugin) {
         std::promise<void> ready;
-        thread_ = std::thread([this, bus, options = Tools::Daemon::DaemonOptions{rights, listener},
-                               &ready] { serve(bus, options, ready); });
+        thread_ = std::thread(
+            [this, bus, options = std::move(options), &ready] { serve(bus, options, ready); });
         ready.get_future().get();
     }
     ~DaemonUnderTest() { stop(); }

@@ -88,8 +88,8 @@ void Daemon::add(PluggedSurface surface) {
             listener.handle(event);
         };
     }
-    device.instance = std::make_unique<SurfaceInstance>(loop_, library_, std::move(surface),
-                                                        std::move(settings), std::move(hooks));
+    device.instance = std::make_unique<SurfaceInstance>(
+        loop_, library_, std::move(surface), std::move(settings), std::move(hooks), options_.times);
     device.object = std::make_unique<DeviceObject>(bus_, rights_, streams_, *device.instance,
                                                    BusNames::devicePath(device.number));
     manager_.announceAdded(device.object->path());

@@ -46,6 +46,7 @@ struct DaemonOptions {
     RightsPolicy rights;
     /// Makes the listener of a surface; may be empty, or give none.
     std::function<std::unique_ptr<EventListener>()> listener = {};
+    SurfaceTimes times = {};
 };
 
 /// All surfaces of a source, each with its instance of the plug-in and its object on the bus. What

@@ -148,7 +148,8 @@ int runDaemon(const Arguments& arguments, Streams& streams) {
     const auto keyboard = wantsKeys ? makeKeyboard(map, "daemon", streams) : nullptr;
     const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
     Daemon::Bus bus(arguments.value(kBusOption.name));
-    Daemon::DaemonOptions options{.rights = Daemon::RightsPolicy::ofThisSystem()};
+    Daemon::DaemonOptions options{.rights = Daemon::RightsPolicy::ofThisSystem(),
+                                  .times = {.patience = streams.patience}};
     if (keyboard) {
         options.listener = [&]() -> std::unique_ptr<Daemon::EventListener> {
             return std::make_unique<KeyListener>(map, *keyboard);

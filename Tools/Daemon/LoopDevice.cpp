@@ -37,9 +37,32 @@ void LoopDevice::reportHandled() noexcept {
 
 void LoopDevice::scheduled(const Vexa::RunLoop& loop, const char* mode) noexcept {
     ForwardingDevice::scheduled(loop, mode);
+    {
+        const Vexa::MutexLock guard(lock_);
+        loop_ = loop;
+        mode_ = mode;
+        wasScheduled_ |= static_cast<bool>(loop);
+    }
+    changed_.notify_all();
+    if (!loop && onLeft_) {
+        onLeft_();
+    }
+}
+
+bool LoopDevice::waitUntilScheduled(std::chrono::nanoseconds patience) {
+    const auto until = std::chrono::steady_clock::now() + patience;
     const Vexa::MutexLock guard(lock_);
-    loop_ = loop;
-    mode_ = mode;
+    while (!wasScheduled_) {
+        if (changed_.wait_until(lock_, until) == std::cv_status::timeout) {
+            return wasScheduled_;
+        }
+    }
+    return true;
+}
+
+bool LoopDevice::isScheduled() {
+    const Vexa::MutexLock guard(lock_);
+    return static_cast<bool>(loop_);
 }
 
 ReportCounts LoopDevice::counts() const noexcept {

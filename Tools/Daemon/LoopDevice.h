@@ -7,7 +7,11 @@
 #include "Tools/FrameGaps.h"
 
 #include <atomic>
+#include <chrono>
+#include <condition_variable>
 #include <cstdint>
+#include <functional>
+#include <memory>
 #include <span>
 #include <string>
 #include <utility>
@@ -28,12 +32,21 @@ struct ReportCounts {
 /// between them; all else is the device's.
 class LoopDevice final : public ForwardingDevice {
 public:
-    using ForwardingDevice::ForwardingDevice;
+    /// `onLeft` is called when the device has left the loop that served it, on the thread that did
+    /// it; must not throw or block. May be empty.
+    explicit LoopDevice(std::shared_ptr<Vexa::DeviceBackend> device,
+                        std::function<void()> onLeft = {}) noexcept
+        : ForwardingDevice(std::move(device)), onLeft_(std::move(onLeft)) {}
 
     void reportArrived(std::span<const std::uint8_t> report,
                        std::uint64_t timestamp) noexcept override;
     void reportHandled() noexcept override;
-    void scheduled(const Vexa::RunLoop& loop, const char* mode) noexcept override;
+    void scheduled(const Vexa::RunLoop& loop, const char* mode) noexcept override EXCLUDES(lock_);
+
+    /// Waits until a loop serves the device for the first time; false when none does in time.
+    [[nodiscard]] bool waitUntilScheduled(std::chrono::nanoseconds patience) EXCLUDES(lock_);
+    /// Whether a loop serves it. An unplugged device is served until it is closed. Any thread.
+    [[nodiscard]] bool isScheduled() EXCLUDES(lock_);
 
     /// Runs the callable (it must not throw) on the thread that takes the reports, between two of
     /// them; destroys it when it never can. False when no loop serves the device. Any thread.
@@ -53,7 +66,10 @@ public:
     [[nodiscard]] ReportCounts counts() const noexcept;
 
 private:
+    const std::function<void()> onLeft_;
     Vexa::Mutex lock_;
+    std::condition_variable_any changed_;
+    bool wasScheduled_ GUARDED_BY(lock_) = false;
     Vexa::RunLoop loop_ GUARDED_BY(lock_);
     std::string mode_ GUARDED_BY(lock_);
     FrameGaps gaps_;

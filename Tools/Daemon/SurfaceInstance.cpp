@@ -3,6 +3,7 @@
 #include "Platform/HostClock.h"
 #include "Shared/Util.h"
 #include "Tools/Daemon/PropertyRules.h"
+#include "Tools/Failure.h"
 #include "Tools/ObservedDevice.h"
 #include "Tools/SettingKeys.h"
 
@@ -18,6 +19,9 @@ namespace {
 
 constexpr const char* kWorkerLabel = "vexa-surface";
 constexpr std::string_view kPipelineDomain = "Pipeline.";
+constexpr const char* kNoThread =
+    "the service's input thread did not start or has ended, and takes no reports; its log says "
+    "why. Plug the surface in anew, or restart the daemon";
 
 bool isSetting(const std::string& key) {
     if (!key.starts_with(kPipelineDomain)) {
@@ -70,12 +74,14 @@ struct SurfaceInstance::Parts {
 };
 
 SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& library,
-                                 PluggedSurface surface, Settings settings, Hooks hooks)
+                                 PluggedSurface surface, Settings settings, Hooks hooks,
+                                 SurfaceTimes times)
     : loop_(loop),
       library_(library),
       surface_(std::move(surface)),
       settings_(std::move(settings)),
       hooks_(std::move(hooks)),
+      times_(times),
       parts_(std::make_unique<Parts>()),
       worker_(kWorkerLabel) {
     worker_.submit([this, wanted = settings_]() noexcept {
@@ -84,7 +90,8 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
         try {
             parts_->tap = std::make_shared<InputTap>();
             device = std::make_shared<LoopDevice>(
-                std::make_shared<TappedDevice>(surface_.open(), parts_->tap));
+                std::make_shared<TappedDevice>(surface_.open(), parts_->tap),
+                [this] { loop_.post([this] { lookForThread(); }); });
             parts_->registration.emplace(device);
             parts_->session = std::make_unique<Host::HostSession>(
                 library_, parts_->registration->service(),
@@ -101,6 +108,10 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
                 });
             }
             parts_->session->begin();
+            // The service does not say whether it has the thread that is to take the reports.
+            if (!device->waitUntilScheduled(times_.patience)) {
+                throw Failure(kNoThread);
+            }
             const Vexa::MutexLock guard(deviceLock_);
             device_ = std::move(device);
         } catch (const std::exception& error) {
@@ -112,6 +123,7 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
         loop_.post([this, reason] {
             if (state_ == State::Starting) {
                 setState(reason.empty() ? State::Running : State::Failed, reason);
+                lookForThread();
             }
         });
     });
@@ -133,7 +145,7 @@ void SurfaceInstance::end(bool isUnplugged, std::function<void()> done) {
     worker_.submit([this, isUnplugged, done = std::move(done)]() mutable noexcept {
         try {
             if (parts_->session) {
-                if (isUnplugged) {
+                if (isUnplugged && isServed()) {
                     waitForLastReports(*parts_->session);
                 }
                 parts_->session->end();
@@ -183,6 +195,17 @@ void SurfaceInstance::setState(State state, const std::string& reason) {
     state_ = state;
     reason_ = reason;
     hooks_.onState();
+}
+
+void SurfaceInstance::lookForThread() {
+    if (state_ == State::Running && !isServed()) {
+        setState(State::Failed, kNoThread);
+    }
+}
+
+bool SurfaceInstance::isServed() const {
+    const Vexa::MutexLock guard(deviceLock_);
+    return device_ && device_->isScheduled();
 }
 
 void SurfaceInstance::deliver(const Vexa::HidEvent& event) {
@@ -388,9 +411,13 @@ void SurfaceInstance::ping(std::function<void()> answered) {
     // Its end is the answer, so that a thread that has ended in order does not owe one.
     const std::shared_ptr<void> token(
         nullptr, [&loop = loop_, answered = std::move(answered)](void*) { loop.post(answered); });
-    const Vexa::MutexLock guard(deviceLock_);
-    if (device_) {
-        device_->submit([token]() noexcept {});
+    bool canAnswer = true;
+    {
+        const Vexa::MutexLock guard(deviceLock_);
+        canAnswer = !device_ || device_->submit([token]() noexcept {});
+    }
+    if (state_ == State::Running && !canAnswer) {
+        setState(State::Failed, kNoThread);
     }
 }
 

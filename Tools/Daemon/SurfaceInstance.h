@@ -18,6 +18,7 @@
 #include "Tools/InputTap.h"
 
 #include <atomic>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
@@ -45,6 +46,12 @@ using Settings = std::map<std::string, Vexa::PropertyValue>;
 /// could be had: "DisjointImageCount" and "EventStats".
 Vexa::PropertyValue::Dictionary statisticsOf(const ReportCounts& counts, std::uint64_t gestures,
                                              const Vexa::PropertyValue::Dictionary& counters);
+
+/// How long things of a surface may take.
+struct SurfaceTimes {
+    /// From its begin until its input thread takes reports.
+    std::chrono::nanoseconds patience = std::chrono::seconds(5);
+};
 
 /// Gestures in their order, and how many are missing before them.
 struct Gestures {
@@ -82,9 +89,10 @@ public:
     };
 
     /// Begins to start: opens the device and walks the plug-in's life. `settings` are written
-    /// before the first report. Everything given must outlive it.
+    /// before the first report. Everything given must outlive it. It fails at once when it cannot
+    /// start, and later when its input thread ends by itself.
     SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& library, PluggedSurface surface,
-                    Settings settings, Hooks hooks);
+                    Settings settings, Hooks hooks, SurfaceTimes times = {});
     /// Once end() has called back; before, only when the loop does not run any more.
     ~SurfaceInstance();
     SurfaceInstance(const SurfaceInstance&) = delete;
@@ -135,6 +143,8 @@ private:
     struct Parts;
 
     void setState(State state, const std::string& reason);
+    void lookForThread() EXCLUDES(deviceLock_);
+    [[nodiscard]] bool isServed() const EXCLUDES(deviceLock_);
     void deliver(const Vexa::HidEvent& event) EXCLUDES(lock_);
     void takeGestures() EXCLUDES(lock_);
     struct Question {
@@ -158,6 +168,7 @@ private:
     PluggedSurface surface_;
     Settings settings_;
     Hooks hooks_;
+    const SurfaceTimes times_;
     State state_ = State::Starting;
     std::string reason_;
     std::size_t waiting_ = 0;
