@@ -33,6 +33,7 @@
 #include <optional>
 #include <semaphore>
 #include <span>
+#include <sstream>
 #include <string>
 #include <string_view>
 #include <thread>
@@ -593,18 +594,18 @@ TEST_F(DaemonTest, TheLoopClosesNoDeviceItself) {
 class Witness final : public Tools::Daemon::EventListener {
 public:
     struct Notes {
-        std::promise<void> unplugged;
+        std::promise<void> ending;
         std::promise<void> gone;
         std::atomic<int> events = 0;
-        std::atomic<int> eventsAtUnplug = 0;
+        std::atomic<int> eventsAtEnding = 0;
     };
 
     explicit Witness(Notes& notes) : notes_(notes) {}
 
     void handle(const Vexa::HidEvent&) noexcept override { ++notes_.events; }
-    void surfaceUnplugged() noexcept override {
-        notes_.eventsAtUnplug = notes_.events.load();
-        notes_.unplugged.set_value();
+    void surfaceEnding() noexcept override {
+        notes_.eventsAtEnding = notes_.events.load();
+        notes_.ending.set_value();
     }
     void surfaceGone() noexcept override { notes_.gone.set_value(); }
 
@@ -628,11 +629,74 @@ TEST_F(DaemonTest, TheUnplugIsToldBeforeTheLastReportsAndTheirGesturesComeAllThe
     ASSERT_TRUE(device->sendReport(reset));
     device->unplug();
     daemon->source.unplug("7");
-    notes.unplugged.get_future().get();
-    EXPECT_EQ(notes.eventsAtUnplug, 0);
+    notes.ending.get_future().get();
+    EXPECT_EQ(notes.eventsAtEnding, 0);
     held.letGo();
     notes.gone.get_future().get();
     EXPECT_EQ(notes.events, 1);
+}
+
+/// What is written and told on the daemon's thread, in its order.
+class Sequence final : public std::stringbuf {
+public:
+    class Listener final : public Tools::Daemon::EventListener {
+    public:
+        explicit Listener(Sequence& sequence) : sequence_(sequence) {}
+        void handle(const Vexa::HidEvent&) noexcept override {}
+        void surfaceEnding() noexcept override { sequence_.add("let go"); }
+        void surfaceGone() noexcept override { sequence_.add("gone"); }
+
+    private:
+        Sequence& sequence_;
+    };
+
+    void add(const std::string& what) { seen_.push_back(what); }
+    [[nodiscard]] const std::vector<std::string>& seen() const { return seen_; }
+
+protected:
+    int sync() override {
+        add(str());
+        str("");
+        return 0;
+    }
+
+private:
+    std::vector<std::string> seen_;
+};
+
+/// Whoever does not read the log holds up no release.
+TEST_F(DaemonTest, WhatIsHeldIsLetGoOfBeforeALineIsWritten) {
+    Sequence sequence;
+    std::ostream log(&sequence);
+    daemon.emplace(bus->address(),
+                   Tools::Daemon::DaemonOptions{
+                       .rights = DaemonUnderTest::rightsOfThisUser(),
+                       .listener = [&] { return std::make_unique<Sequence::Listener>(sequence); },
+                   },
+                   VEXATOUCH_PLUGIN_FILE, &log);
+    client.emplace(bus->address());
+    daemon->source.plug(playedSurface("7", example("taps")));
+    waitForState(1, "running");
+    daemon->source.unplug("7");
+    while (!client->devices().empty()) {
+    }
+    auto broken = playedSurface("8", example("taps"));
+    broken.open = []() -> std::shared_ptr<Vexa::DeviceBackend> { throw Failure("no permission"); };
+    daemon->source.plug(broken);
+    waitForState(2, "failed");
+    daemon->source.plug(playedSurface("9", example("taps")));
+    waitForState(3, "running");
+    daemon->stop();
+    std::vector<std::string> seen = sequence.seen();
+    // Of the first one this may come at any time.
+    const auto gone = std::ranges::find(seen, "gone");
+    ASSERT_NE(gone, seen.end());
+    seen.erase(gone);
+    EXPECT_THAT(seen, ElementsAre("surface 1, /dev/hidraw7, Surface 7: running\n", "let go",
+                                  "surface 1, /dev/hidraw7, Surface 7: unplugged\n", "let go",
+                                  "surface 2, /dev/hidraw8, Surface 8: no permission\n",
+                                  "surface 3, /dev/hidraw9, Surface 9: running\n", "let go",
+                                  "let go", "gone", "gone"));
 }
 
 TEST_F(DaemonTest, ASurfaceThatCannotBeOpenedSaysWhy) {

@@ -21,6 +21,7 @@
 #include <iostream>
 #include <memory>
 #include <mutex>
+#include <ostream>
 #include <sstream>
 #include <string>
 #include <thread>
@@ -105,8 +106,8 @@ public:
         : DaemonUnderTest(bus, Tools::Daemon::DaemonOptions{.rights = std::move(rights),
                                                             .listener = std::move(listener)}) {}
     DaemonUnderTest(const std::string& bus, Tools::Daemon::DaemonOptions options,
-                    const std::string& plugin = VEXATOUCH_PLUGIN_FILE)
-        : library_(plugin) {
+                    const std::string& plugin = VEXATOUCH_PLUGIN_FILE, std::ostream* log = nullptr)
+        : library_(plugin), logTo_(log != nullptr ? *log : log_) {
         std::promise<void> ready;
         thread_ = std::thread(
             [this, bus, options = std::move(options), &ready] { serve(bus, options, ready); });
@@ -162,7 +163,7 @@ private:
                std::promise<void>& ready) {
         Tools::Daemon::Bus bus(address);
         bus.attach(loop_, [this] { loop_.stop(); });
-        Tools::Daemon::Daemon daemon(loop_, bus, library_, source, options, log_);
+        Tools::Daemon::Daemon daemon(loop_, bus, library_, source, options, logTo_);
         daemon_ = &daemon;
         const Tools::Daemon::Watchdog watchdog(loop_, daemon, [] {});
         ready.set_value();
@@ -173,6 +174,7 @@ private:
     Tools::Daemon::EventLoop loop_;
     Tools::Daemon::Daemon* daemon_ = nullptr;
     std::ostringstream log_;
+    std::ostream& logTo_;
     std::thread thread_;
 };
 

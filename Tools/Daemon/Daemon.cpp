@@ -104,6 +104,9 @@ void Daemon::stateChanged(Device& device) {
             log_ << device.title() << ": running" << std::endl;
             break;
         case SurfaceInstance::State::Failed:
+            if (device.listener) {
+                device.listener->surfaceEnding();
+            }
             log_ << device.title() << ": " << forTerminal(device.instance->reason()) << std::endl;
             break;
         case SurfaceInstance::State::Starting:
@@ -120,11 +123,9 @@ void Daemon::stateChanged(Device& device) {
 
 void Daemon::remove(const std::string& id) {
     if (Device* device = find(id)) {
-        log_ << device->title() << ": unplugged" << std::endl;
-        if (device->listener) {
-            device->listener->surfaceUnplugged();
-        }
         takeDown(*device, true);
+        // Whoever reads the log slowly holds up only the line.
+        log_ << device->title() << ": unplugged" << std::endl;
     }
 }
 
@@ -144,6 +145,9 @@ Daemon::Device* Daemon::find(const std::string& id) const {
 }
 
 void Daemon::takeDown(Device& device, bool isUnplugged) {
+    if (device.listener) {
+        device.listener->surfaceEnding();
+    }
     device.plugged = false;
     manager_.announceRemoved(device.object->path());
     device.object->withdraw();
@@ -153,6 +157,9 @@ void Daemon::takeDown(Device& device, bool isUnplugged) {
 }
 
 void Daemon::taken(Device& device) {
+    if (device.listener) {
+        device.listener->surfaceGone();
+    }
     const ReportCounts counts = device.instance->counts();
     reportsOfGone_ += counts.reports;
     framesLostOfGone_ += counts.framesLost;
@@ -165,9 +172,6 @@ void Daemon::taken(Device& device) {
     // the surface was back before: then what was set since is.
     if (!device.hasComeBack && device.instance->settings() != device.settings) {
         remember(device.instance->surface().key(), device.instance->settings());
-    }
-    if (device.listener) {
-        device.listener->surfaceGone();
     }
     std::erase_if(devices_, [&](const auto& each) { return each.get() == &device; });
     if (onChange) {

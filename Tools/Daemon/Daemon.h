@@ -35,9 +35,10 @@ public:
 
     /// On the host's queue of this surface; must not throw.
     virtual void handle(const Vexa::HidEvent& event) noexcept = 0;
-    /// It was unplugged. What it had sent before may still be on its way, and comes yet. On the
-    /// loop's thread.
-    virtual void surfaceUnplugged() noexcept = 0;
+    /// It has failed or is about to be taken down: let go of what is held for it, before anything
+    /// that may wait. Events may still be on their way, and come yet. On the loop's thread, perhaps
+    /// more than once.
+    virtual void surfaceEnding() noexcept = 0;
     /// No event comes any more. On the loop's thread.
     virtual void surfaceGone() noexcept = 0;
 };

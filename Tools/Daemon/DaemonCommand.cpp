@@ -88,7 +88,7 @@ public:
     void handle(const Vexa::HidEvent& event) noexcept override { keys_.handle(event); }
     // A key that is held must not go on while last reports are waited for; their gestures press
     // anew.
-    void surfaceUnplugged() noexcept override { keys_.releaseAll(); }
+    void surfaceEnding() noexcept override { keys_.releaseAll(); }
     void surfaceGone() noexcept override { keys_.releaseAll(); }
 
 private:
