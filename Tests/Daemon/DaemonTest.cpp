@@ -804,6 +804,36 @@ TEST_F(DaemonTest, ASurfaceThatFailedIsBegunAnewWhenThereIsNewsOfIt) {
               "surface 4, /dev/hidraw8, Surface 8: running\n");
 }
 
+TEST_F(DaemonTest, NewsOfASurfaceThatIsStartingCountsWhenItFails) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    auto surface = playedSurface("7", example("taps"));
+    std::promise<void> opening;
+    std::promise<void> refused;
+    int opens = 0;
+    surface.open = [&, open = surface.open]() -> std::shared_ptr<Vexa::DeviceBackend> {
+        if (++opens > 1) {
+            return open();
+        }
+        opening.set_value();
+        refused.get_future().get();
+        throw Failure("/dev/hidraw7: no permission");
+    };
+    daemon->source.plug(surface);
+    opening.get_future().get();
+    daemon->source.touch(surface);
+    // What came before it has been taken as well.
+    daemon->source.plug(playedSurface("8", example("taps")));
+    waitForState(2, "running");
+    refused.set_value();
+    waitForState(3, "running");
+    daemon->stop();
+    EXPECT_EQ(daemon->log(),
+              "surface 2, /dev/hidraw8, Surface 8: running\n"
+              "surface 1, /dev/hidraw7, Surface 7: /dev/hidraw7: no permission\n"
+              "surface 3, /dev/hidraw7, Surface 7: running\n");
+}
+
 TEST_F(DaemonTest, AFloodOfCallsIsAnsweredOrToldThatItIsTooMuch) {
     start();
     Tools::Daemon::EventLoop loop;

@@ -6,6 +6,7 @@
 #include <sys/epoll.h>
 
 #include <algorithm>
+#include <optional>
 #include <utility>
 
 namespace VexaTouch::Tools::Daemon {
@@ -13,8 +14,9 @@ namespace VexaTouch::Tools::Daemon {
 struct Daemon::Device {
     unsigned number = 0;
     bool plugged = true;
-    Settings settings;         // as they were when it was unplugged
-    bool hasComeBack = false;  // another one has taken over
+    Settings settings;                   // as they were when it was unplugged
+    bool hasComeBack = false;            // another one has taken over
+    std::optional<PluggedSurface> news;  // that came while it was starting
     std::unique_ptr<EventListener> listener;
     std::unique_ptr<SurfaceInstance> instance;
     std::unique_ptr<DeviceObject> object;
@@ -101,6 +103,7 @@ void Daemon::add(PluggedSurface surface) {
 void Daemon::stateChanged(Device& device) {
     switch (device.instance->state()) {
         case SurfaceInstance::State::Running:
+            device.news.reset();
             log_ << device.title() << ": running" << std::endl;
             break;
         case SurfaceInstance::State::Failed:
@@ -108,6 +111,11 @@ void Daemon::stateChanged(Device& device) {
                 device.listener->surfaceEnding();
             }
             log_ << device.title() << ": " << forTerminal(device.instance->reason()) << std::endl;
+            if (device.news) {
+                // Not from within the list of devices that may be being gone through.
+                loop_.post(
+                    [this, news = *std::exchange(device.news, std::nullopt)] { tryAgain(news); });
+            }
             break;
         case SurfaceInstance::State::Starting:
         case SurfaceInstance::State::Ending:
@@ -131,9 +139,15 @@ void Daemon::remove(const std::string& id) {
 
 void Daemon::tryAgain(PluggedSurface surface) {
     Device* device = find(surface.id);
-    if (device != nullptr && device->instance->state() == SurfaceInstance::State::Failed) {
+    if (device == nullptr) {
+        return;
+    }
+    if (device->instance->state() == SurfaceInstance::State::Failed) {
         takeDown(*device, false);
         add(std::move(surface));
+    } else if (device->instance->state() == SurfaceInstance::State::Starting) {
+        // It may fail for what was so before the news.
+        device->news = std::move(surface);
     }
 }
 
