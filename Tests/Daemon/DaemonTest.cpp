@@ -347,6 +347,49 @@ TEST_F(DaemonTest, ASurfaceThatComesBackHasItsSettings) {
               "surface 3, /dev/hidraw10, Surface 10: running\n");
 }
 
+TEST_F(DaemonTest, TwoSurfacesWithOneSerialNumberHaveTheirOwnSettings) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    const auto twin = [](const std::string& id) {
+        auto surface = playedSurface(id, example("taps"));
+        surface.serial = "0000";
+        return surface;
+    };
+    daemon->source.plug(twin("7"));
+    daemon->source.plug(twin("8"));
+    waitForState(1, "running");
+    waitForState(2, "running");
+    client->set(first, kHoldTimeout, 300);
+    daemon->source.unplug("7");
+    daemon->source.unplug("8");
+    daemon->source.plug(twin("8"));
+    daemon->source.plug(twin("7"));
+    waitForState(3, "running");
+    waitForState(4, "running");
+    EXPECT_EQ(client->get(BusNames::devicePath(3), kHoldTimeout), PropertyValue(500U));
+    EXPECT_EQ(client->get(BusNames::devicePath(4), kHoldTimeout), PropertyValue(300U));
+}
+
+TEST_F(DaemonTest, ASurfaceWithoutASerialNumberHasTheSettingsOfItsPlace) {
+    daemon.emplace(bus->address());
+    client.emplace(bus->address());
+    const auto nameless = [](const std::string& id) {
+        auto surface = playedSurface(id, example("taps"));
+        surface.serial.clear();
+        return surface;
+    };
+    daemon->source.plug(nameless("7"));
+    waitForState(1, "running");
+    client->set(first, kHoldTimeout, 300);
+    daemon->source.unplug("7");
+    daemon->source.plug(nameless("8"));
+    daemon->source.plug(nameless("7"));
+    waitForState(2, "running");
+    waitForState(3, "running");
+    EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(500U));
+    EXPECT_EQ(client->get(BusNames::devicePath(3), kHoldTimeout), PropertyValue(300U));
+}
+
 /// A device whose feature reports are answered one by one, each once it is allowed.
 class GatedDevice final : public Tools::ForwardingDevice {
 public:

@@ -70,12 +70,9 @@ void Daemon::takeChanges() {
 }
 
 void Daemon::add(PluggedSurface surface) {
+    RememberedSettings::Arrival arrival = remembered_.arrive(surface.identity());
     for (const auto& before : devices_) {
-        before->hasComeBack |= before->instance->surface().key() == surface.key();
-    }
-    Settings settings;
-    if (const auto found = remembered_.find(surface.key()); found != remembered_.end()) {
-        settings = found->second;
+        before->hasComeBack |= before->instance->surface().identity() == arrival.before;
     }
     Device& device = *devices_.emplace_back(std::make_unique<Device>());
     device.number = ++lastNumber_;
@@ -90,8 +87,9 @@ void Daemon::add(PluggedSurface surface) {
             listener.handle(event);
         };
     }
-    device.instance = std::make_unique<SurfaceInstance>(
-        loop_, library_, std::move(surface), std::move(settings), std::move(hooks), options_.times);
+    device.instance = std::make_unique<SurfaceInstance>(loop_, library_, std::move(surface),
+                                                        std::move(arrival.settings),
+                                                        std::move(hooks), options_.times);
     device.object = std::make_unique<DeviceObject>(bus_, rights_, streams_, *device.instance,
                                                    BusNames::devicePath(device.number));
     manager_.announceAdded(device.object->path());
@@ -166,7 +164,7 @@ void Daemon::takeDown(Device& device, bool isUnplugged) {
     manager_.announceRemoved(device.object->path());
     device.object->withdraw();
     device.settings = device.instance->settings();
-    remember(device.instance->surface().key(), device.settings);
+    remembered_.leave(device.instance->surface().identity(), device.settings);
     device.instance->end(isUnplugged, [this, &device] { taken(device); });
 }
 
@@ -185,7 +183,7 @@ void Daemon::taken(Device& device) {
     // What was asked for before the unplug and taken only afterwards is in force as well, unless
     // the surface was back before: then what was set since is.
     if (!device.hasComeBack && device.instance->settings() != device.settings) {
-        remember(device.instance->surface().key(), device.instance->settings());
+        remembered_.correct(device.instance->surface().identity(), device.instance->settings());
     }
     std::erase_if(devices_, [&](const auto& each) { return each.get() == &device; });
     if (onChange) {
@@ -193,22 +191,6 @@ void Daemon::taken(Device& device) {
     }
     if (devices_.empty() && ended_) {
         std::exchange(ended_, nullptr)();
-    }
-}
-
-void Daemon::remember(const std::string& key, Settings settings) {
-    if (remembered_.contains(key)) {
-        std::erase(oldest_, key);
-    }
-    if (settings.empty()) {
-        remembered_.erase(key);
-        return;
-    }
-    remembered_.insert_or_assign(key, std::move(settings));
-    oldest_.push_back(key);
-    if (oldest_.size() > kMostRemembered) {
-        remembered_.erase(oldest_.front());
-        oldest_.pop_front();
     }
 }
 

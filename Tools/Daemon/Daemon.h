@@ -9,13 +9,12 @@
 #include "Tools/Daemon/EventLoop.h"
 #include "Tools/Daemon/ManagerObject.h"
 #include "Tools/Daemon/RecordStreams.h"
+#include "Tools/Daemon/RememberedSettings.h"
 #include "Tools/Daemon/SurfaceInstance.h"
 
 #include <cstddef>
 #include <cstdint>
-#include <deque>
 #include <functional>
-#include <map>
 #include <memory>
 #include <ostream>
 #include <string>
@@ -54,9 +53,6 @@ struct DaemonOptions {
 /// was set on one stays in force when it is plugged in again. One thread, the loop's.
 class Daemon {
 public:
-    /// Devices that are gone and whose settings are remembered.
-    static constexpr std::size_t kMostRemembered = 64;
-
     /// Outcomes are written to `log`, each once. Everything given must outlive it. Offers the
     /// objects and asks for the name. Throws Failure.
     Daemon(EventLoop& loop, Bus& bus, const Host::PluginLibrary& library, DeviceSource& source,
@@ -94,7 +90,6 @@ private:
     void takeDown(Device& device, bool isUnplugged);
     void taken(Device& device);
     void stateChanged(Device& device);
-    void remember(const std::string& key, Settings settings);
     [[nodiscard]] std::vector<std::string> paths() const;
 
     EventLoop& loop_;
@@ -109,8 +104,7 @@ private:
     unsigned lastNumber_ = 0;
     std::uint64_t reportsOfGone_ = 0;
     std::uint64_t framesLostOfGone_ = 0;
-    std::map<std::string, Settings> remembered_;
-    std::deque<std::string> oldest_;
+    RememberedSettings remembered_;
     std::function<void()> ended_;
     ManagerObject manager_;
     EventLoop::WatchHandle sourceWatch_;

@@ -10,6 +10,21 @@
 
 namespace VexaTouch::Tools::Daemon {
 
+/// What tells one surface from another, over the time of its being plugged in.
+struct SurfaceIdentity {
+    std::uint16_t vendor = 0;
+    std::uint16_t product = 0;
+    std::string serial;  ///< empty when it has none
+    std::string place;   ///< where it is plugged in
+
+    /// Whether both have a serial number and it is the same.
+    [[nodiscard]] bool hasNumberOf(const SurfaceIdentity& other) const {
+        return vendor == other.vendor && product == other.product && !serial.empty() &&
+               serial == other.serial;
+    }
+    friend bool operator==(const SurfaceIdentity&, const SurfaceIdentity&) = default;
+};
+
 /// A surface that is plugged in.
 struct PluggedSurface {
     std::string id;    ///< for its source; no two that are plugged in at once have the same
@@ -27,11 +42,8 @@ struct PluggedSurface {
     /// empty.
     std::function<void(Setter set)> useSetter;
 
-    /// Whether the other one is this very device, plugged in another time: by its serial number if
-    /// it has one, else by the place where it is plugged in.
-    [[nodiscard]] std::string key() const {
-        return std::to_string(vendor) + ':' + std::to_string(product) + ':' +
-               (serial.empty() ? "at " + physicalPath : "no " + serial);
+    [[nodiscard]] SurfaceIdentity identity() const {
+        return {.vendor = vendor, .product = product, .serial = serial, .place = physicalPath};
     }
 };
 

@@ -12,6 +12,7 @@
 #include "Tools/Daemon/DeviceSource.h"
 #include "Tools/Daemon/EventLoop.h"
 #include "Tools/Daemon/LoopDevice.h"
+#include "Tools/Daemon/RememberedSettings.h"
 #include "Tools/DeliveredEvent.h"
 #include "Tools/FileDescriptor.h"
 #include "Tools/FrameFeed.h"
@@ -37,9 +38,6 @@ struct Outcome {
     std::optional<Value> value = {};
     std::optional<BusError> error = {};
 };
-
-/// Settings by the keys of the service.
-using Settings = std::map<std::string, Vexa::PropertyValue>;
 
 /// What a surface has counted, as the daemon tells it: "Reports", "Images", "FirmwareEvents",
 /// "InvalidReports", "Gaps", "FramesLost", "Gestures", and what the service has counted, if that
