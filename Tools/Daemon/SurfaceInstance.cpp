@@ -10,6 +10,7 @@
 #include <algorithm>
 #include <chrono>
 #include <exception>
+#include <new>
 #include <string_view>
 #include <thread>
 #include <utility>
@@ -33,6 +34,10 @@ bool isSetting(const std::string& key) {
 
 BusError notTaken(const std::string& key) {
     return {ErrorName::kFailed, key + ": the device did not take the value"};
+}
+
+BusError noMemory() {
+    return {ErrorName::kBusy, "there is no memory for the call; try again"};
 }
 
 /// Returns when the service has read an unplugged device to its end, or when it does not get there
@@ -254,28 +259,31 @@ void SurfaceInstance::takePlace(const Question& question) {
     if (waiting_ >= kMostWaiting) {
         throw BusError(ErrorName::kBusy, "too many calls wait for this surface; try again");
     }
-    ++waiting_;
     ++waitingOf_[question.caller.user];
+    ++waiting_;
     waitingOfWatchers_ += question.isWatchers() ? 1 : 0;
 }
 
-void SurfaceInstance::leavePlace(const Question& question) {
+void SurfaceInstance::leavePlace(const Question& question) noexcept {
     --waiting_;
     if (const auto ofUser = waitingOf_.find(question.caller.user); --ofUser->second == 0) {
         waitingOf_.erase(ofUser);
     }
     waitingOfWatchers_ -= question.isWatchers() ? 1 : 0;
-    if (question.isOneByOne()) {
-        isOneAsked_ = false;
-        submitHeld();
-    }
 }
 
 void SurfaceInstance::submitHeld() {
-    if (!held_.empty()) {
-        isOneAsked_ = true;
-        worker_.submit([task = std::move(held_.front())]() noexcept { task(); });
+    isOneAsked_ = false;
+    while (!isOneAsked_ && !held_.empty()) {
+        const Held next = std::move(held_.front());
         held_.pop_front();
+        try {
+            worker_.submit([task = next.task]() noexcept { task(); });
+            isOneAsked_ = true;
+        } catch (const std::bad_alloc&) {
+            leavePlace(next.question);
+            next.refuse(noMemory());
+        }
     }
 }
 
@@ -287,32 +295,47 @@ void SurfaceInstance::ask(const Question& question, Work work,
             ErrorName::kNotRunning,
             "the surface is not running: " + (reason_.empty() ? "it is " + stateText() : reason_));
     }
-    takePlace(question);
-    auto task = [this, question, work = std::move(work),
-                 done = std::move(done)]() mutable noexcept {
-        Outcome<Value> outcome;
-        try {
-            if (ending_ && !question.isOfSettings) {
-                throw BusError(ErrorName::kNotRunning, "the surface is being taken down");
-            }
-            outcome.value = work(*parts_);
-        } catch (const BusError& error) {
-            outcome.error = error;
-        } catch (const std::exception& error) {
-            outcome.error = BusError(ErrorName::kFailed, error.what());
-        }
-        loop_.post([this, question, outcome = std::move(outcome), done = std::move(done)] {
-            leavePlace(question);
-            done(outcome);
-        });
+    struct Asked {
+        Work work;
+        std::function<void(const Outcome<Value>& outcome)> done;
     };
-    if (!question.isOneByOne()) {
-        worker_.submit(std::move(task));
-        return;
-    }
-    held_.emplace_back(std::move(task));
-    if (!isOneAsked_) {
-        submitHeld();
+    takePlace(question);
+    try {
+        const auto asked = std::make_shared<Asked>(std::move(work), std::move(done));
+        const auto task = [this, question, asked]() noexcept {
+            Outcome<Value> outcome;
+            try {
+                if (ending_ && !question.isOfSettings) {
+                    throw BusError(ErrorName::kNotRunning, "the surface is being taken down");
+                }
+                outcome.value = asked->work(*parts_);
+            } catch (const BusError& error) {
+                outcome.error = error;
+            } catch (const std::exception& error) {
+                outcome.error = BusError(ErrorName::kFailed, error.what());
+            }
+            // Moved, since what it holds is the loop's and may not go on this thread.
+            loop_.post(
+                [this, question, outcome = std::move(outcome), done = std::move(asked->done)] {
+                    leavePlace(question);
+                    if (question.isOneByOne()) {
+                        submitHeld();
+                    }
+                    done(outcome);
+                });
+        };
+        if (question.isOneByOne() && isOneAsked_) {
+            held_.push_back(
+                {.question = question, .task = task, .refuse = [asked](const BusError& error) {
+                     asked->done({.value = {}, .error = error});
+                 }});
+            return;
+        }
+        worker_.submit(task);
+        isOneAsked_ |= question.isOneByOne();
+    } catch (const std::bad_alloc&) {
+        leavePlace(question);
+        throw noMemory();
     }
 }
 

@@ -146,7 +146,7 @@ private:
     void deliver(const Vexa::HidEvent& event) EXCLUDES(lock_);
     void takeGestures() EXCLUDES(lock_);
     struct Question {
-        Caller caller;
+        Caller caller = {};
         bool asksDevice = false;
         bool isOfSettings = false;  // answered even behind the end
 
@@ -154,11 +154,17 @@ private:
         /// Whether there is no more than one such at a time.
         [[nodiscard]] bool isOneByOne() const noexcept { return isWatchers() && asksDevice; }
     };
+    /// A question that waits for those before it which go one by one.
+    struct Held {
+        Question question;
+        std::function<void()> task;
+        std::function<void(const BusError& error)> refuse;
+    };
     template <typename Value, typename Work>
     void ask(const Question& question, Work work,
              std::function<void(const Outcome<Value>& outcome)> done);
     void takePlace(const Question& question);
-    void leavePlace(const Question& question);
+    void leavePlace(const Question& question) noexcept;
     void submitHeld();
 
     EventLoop& loop_;
@@ -172,8 +178,8 @@ private:
     std::size_t waiting_ = 0;
     std::map<uid_t, std::size_t> waitingOf_;  // by user
     std::size_t waitingOfWatchers_ = 0;
-    bool isOneAsked_ = false;                 // of those that go one by one
-    std::deque<std::function<void()>> held_;  // those behind it
+    bool isOneAsked_ = false;  // of those that go one by one
+    std::deque<Held> held_;    // those behind it
     std::atomic<bool> ending_ = false;
     std::uint64_t gestures_ = 0;
     // The worker gives it and takes it back; whoever else uses it does so under the lock, so that
