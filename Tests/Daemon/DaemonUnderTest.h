@@ -15,6 +15,8 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <condition_variable>
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <future>
@@ -94,6 +96,37 @@ inline Tools::Daemon::PluggedSurface playedSurface(const std::string& id, const 
 inline std::string example(const std::string& name) {
     return "recording:" VEXA_SOURCE_DIR "/Examples/" + name + ".json@max";
 }
+
+/// A log that can be waited for. Any thread.
+class LogOfLines final : public std::stringbuf {
+public:
+    void waitFor(const std::string& text) {
+        std::unique_lock guard(lock_);
+        more_.wait(guard, [&] { return text_.find(text) != std::string::npos; });
+    }
+    [[nodiscard]] std::size_t count(const std::string& text) {
+        const std::lock_guard guard(lock_);
+        std::size_t found = 0;
+        for (std::size_t at = 0; (at = text_.find(text, at)) != std::string::npos; ++at) {
+            ++found;
+        }
+        return found;
+    }
+
+protected:
+    int sync() override {
+        const std::lock_guard guard(lock_);
+        text_ += str();
+        str("");
+        more_.notify_all();
+        return 0;
+    }
+
+private:
+    std::mutex lock_;
+    std::condition_variable more_;
+    std::string text_;
+};
 
 /// The daemon on a thread of this process, and its source.
 class DaemonUnderTest {

@@ -79,8 +79,9 @@ void Daemon::add(PluggedSurface surface) {
     device.listener = options_.listener ? options_.listener() : nullptr;
     SurfaceInstance::Hooks hooks;
     hooks.onState = [this, &device] { stateChanged(device); };
-    hooks.onGestures = [&device](const Gestures& gestures) {
+    hooks.onGestures = [this, &device](const Gestures& gestures) {
         device.object->announceGestures(gestures);
+        tellFailure(device);
     };
     if (device.listener) {
         hooks.onEvent = [&listener = *device.listener](const Vexa::HidEvent& event) {
@@ -119,11 +120,21 @@ void Daemon::stateChanged(Device& device) {
         case SurfaceInstance::State::Ending:
             break;
     }
+    tellFailure(device);
     if (device.object) {
         device.object->announceState();
     }
     if (onChange) {
         onChange();
+    }
+}
+
+void Daemon::tellFailure(const Device& device) {
+    if (!device.listener) {
+        return;
+    }
+    if (const auto failure = device.listener->takeFailure()) {
+        log_ << "vexatouch daemon: " << *failure << std::endl;
     }
 }
 
@@ -172,6 +183,7 @@ void Daemon::taken(Device& device) {
     if (device.listener) {
         device.listener->surfaceGone();
     }
+    tellFailure(device);
     const ReportCounts counts = device.instance->counts();
     reportsOfGone_ += counts.reports;
     framesLostOfGone_ += counts.framesLost;

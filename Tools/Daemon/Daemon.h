@@ -16,6 +16,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <ostream>
 #include <string>
 #include <vector>
@@ -40,6 +41,9 @@ public:
     virtual void surfaceEnding() noexcept = 0;
     /// No event comes any more. On the loop's thread.
     virtual void surfaceGone() noexcept = 0;
+    /// What it has failed with, in one line, once. On the loop's thread, after events and after
+    /// each of both above.
+    [[nodiscard]] virtual std::optional<std::string> takeFailure() { return std::nullopt; }
 };
 
 struct DaemonOptions {
@@ -90,6 +94,7 @@ private:
     void takeDown(Device& device, bool isUnplugged);
     void taken(Device& device);
     void stateChanged(Device& device);
+    void tellFailure(const Device& device);
     [[nodiscard]] std::vector<std::string> paths() const;
 
     EventLoop& loop_;

@@ -1,13 +1,12 @@
 #include "Tools/Daemon/DaemonCommand.h"
 
 #include "Host/KeyMap.h"
-#include "Host/MediaKeys.h"
 #include "Host/PluginLibrary.h"
-#include "Host/SharedKeyboard.h"
 #include "Host/SurfaceMatch.h"
 #include "Tools/Daemon/Bus.h"
 #include "Tools/Daemon/Daemon.h"
 #include "Tools/Daemon/EventLoop.h"
+#include "Tools/Daemon/KeyListener.h"
 #include "Tools/Daemon/PlayedSource.h"
 #include "Tools/Daemon/ServiceNotify.h"
 #include "Tools/Daemon/Watchdog.h"
@@ -25,7 +24,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -79,21 +77,6 @@ constexpr std::string_view kDescription =
     "Under systemd it says when it is ready, what it serves, and answers the watchdog as long as "
     "the input thread of every surface answers; anywhere else it just runs. A second signal while "
     "surfaces are being taken down ends it at once, by that signal.";
-
-class KeyListener final : public Daemon::EventListener {
-public:
-    KeyListener(const Host::KeyMap& map, Host::SharedKeyboard& keyboard) noexcept
-        : keys_(map, keyboard) {}
-
-    void handle(const Vexa::HidEvent& event) noexcept override { keys_.handle(event); }
-    // A key that is held must not go on while last reports are waited for; their gestures press
-    // anew.
-    void surfaceEnding() noexcept override { keys_.releaseAll(); }
-    void surfaceGone() noexcept override { keys_.releaseAll(); }
-
-private:
-    Host::MediaKeys keys_;
-};
 
 std::unique_ptr<Daemon::DeviceSource> makeSource(const Arguments& arguments, Streams& streams) {
     const std::vector<std::string>& devices = arguments.values("--device");
@@ -152,7 +135,7 @@ int runDaemon(const Arguments& arguments, Streams& streams) {
                                   .times = {.patience = streams.patience}};
     if (keyboard) {
         options.listener = [&]() -> std::unique_ptr<Daemon::EventListener> {
-            return std::make_unique<KeyListener>(map, *keyboard);
+            return std::make_unique<Daemon::KeyListener>(map, *keyboard);
         };
     }
     Daemon::Daemon daemon(loop, bus, library, *source, std::move(options), streams.error);
@@ -173,12 +156,7 @@ int runDaemon(const Arguments& arguments, Streams& streams) {
             end();
         }
     });
-    const auto tellStatus = [&] {
-        Daemon::ServiceNotify::status(statusText(daemon));
-        if (const auto failure = keyboard ? keyboard->takeFailure() : std::nullopt) {
-            streams.error << "vexatouch daemon: " << *failure << std::endl;
-        }
-    };
+    const auto tellStatus = [&] { Daemon::ServiceNotify::status(statusText(daemon)); };
     daemon.onChange = tellStatus;
     Daemon::ServiceNotify::ready();
     tellStatus();
