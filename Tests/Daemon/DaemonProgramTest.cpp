@@ -22,7 +22,9 @@
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
+#include <iterator>
 #include <optional>
+#include <regex>
 #include <string>
 #include <system_error>
 #include <vector>
@@ -74,6 +76,29 @@ TEST_F(DaemonProgramTest, TellsItsManagerWhatItServesAndThatItLives) {
     daemon.signal(SIGTERM);
     manager.heardUntil("STOPPING=1");
     EXPECT_TRUE(endedWith(daemon.end(), 0));
+}
+
+TEST_F(DaemonProgramTest, TheStatusFollowsWhatComesWithoutAWatchdogAsWell) {
+    ServiceManager manager(folder.path("notify"));
+    ProgramRun daemon(daemonOn("sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture"));
+    // At the start, when it runs, and with the first gesture.
+    std::string heard;
+    const std::regex status("STATUS=1 surface, ");
+    while (std::distance(std::sregex_iterator(heard.begin(), heard.end(), status), {}) < 3) {
+        heard += manager.heardUntil("STATUS=1 surface, ");
+    }
+    daemon.signal(SIGTERM);
+    EXPECT_TRUE(endedWith(daemon.end(), 0));
+}
+
+TEST_F(DaemonProgramTest, TheStatusAndALineTellOfLostFrames) {
+    ServiceManager manager(folder.path("notify"));
+    ProgramRun daemon(daemonOn(example("mixed")));
+    manager.heardUntil(" reports, 4 frames lost");
+    daemon.signal(SIGTERM);
+    EXPECT_TRUE(endedWith(daemon.end(), 0));
+    EXPECT_THAT(daemon.error(), ::testing::ContainsRegex(
+                                    "mixed.json@max: (so far|in all) [12] gaps?, 4 frames lost\n"));
 }
 
 TEST_F(DaemonProgramTest, ASecondSignalEndsATakeDownThatDoesNotEnd) {

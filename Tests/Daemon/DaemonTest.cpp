@@ -4,6 +4,7 @@
 #include "Platform/ScriptedDevice.h"
 #include "Shared/InputReport.h"
 #include "Tests/Daemon/DaemonUnderTest.h"
+#include "Tests/Support/Touch.h"
 #include "Tests/Tools/VexatouchProgram.h"
 #include "Tools/Daemon/BusNames.h"
 #include "Tools/Daemon/LiveDevice.h"
@@ -542,6 +543,49 @@ TEST_F(DaemonTest, TheServiceCountsTheSameGaps) {
     EXPECT_EQ(statistics.member("FramesLost"), PropertyValue(4U));
     EXPECT_EQ(statistics.member("DisjointImageCount"), PropertyValue(2U));
     EXPECT_TRUE(statistics.member("EventStats").asDictionary());
+}
+
+TEST_F(DaemonTest, LostFramesAreToldWhenTheyAreMissedAndAtTheEnd) {
+    LogOfLines log;
+    std::ostream stream(&log);
+    const auto sent = [](std::uint32_t number) { return imageReport(Samples(), number, 0); };
+    for (const bool often : {false, true}) {
+        daemon.emplace(
+            bus->address(),
+            Tools::Daemon::DaemonOptions{
+                .rights = DaemonUnderTest::rightsOfThisUser(),
+                .times = {.betweenGaps = often ? std::chrono::hours(0) : std::chrono::hours(100)},
+            },
+            VEXATOUCH_PLUGIN_FILE, &stream);
+        client.emplace(bus->address());
+        const auto device = std::make_shared<Vexa::ScriptedDevice>();
+        auto surface = playedSurface("7", example("taps"));
+        surface.open = [device] { return device; };
+        daemon->source.plug(surface);
+        waitForState(1, "running");
+        ASSERT_TRUE(device->sendReport(sent(1)));
+        ASSERT_TRUE(device->sendReport(sent(3)));
+        log.waitFor(": so far 1 gap, 1 frame lost\n");
+        ASSERT_TRUE(device->sendReport(sent(13)));
+        if (often) {
+            log.waitFor(": so far 2 gaps, 10 frames lost\n");
+        }
+        waitForReports(1, 3);
+        daemon->source.unplug("7");
+        while (!client->devices().empty()) {
+        }
+        daemon->stop();
+        EXPECT_EQ(log.take(),
+                  "surface 1, /dev/hidraw7, Surface 7: running\n"
+                  "surface 1, /dev/hidraw7, Surface 7: so far 1 gap, 1 frame lost\n" +
+                      std::string(often ? "surface 1, /dev/hidraw7, Surface 7: so far 2 gaps, 10 "
+                                          "frames lost\n"
+                                        : "") +
+                      "surface 1, /dev/hidraw7, Surface 7: unplugged\n" +
+                      (often ? ""
+                             : "surface 1, /dev/hidraw7, Surface 7: in all 2 gaps, 10 frames "
+                               "lost\n"));
+    }
 }
 
 /// A surface whose input thread is held once it has handled the first report.

@@ -104,6 +104,11 @@ public:
         std::unique_lock guard(lock_);
         more_.wait(guard, [&] { return text_.find(text) != std::string::npos; });
     }
+    /// All of it, which begins anew.
+    [[nodiscard]] std::string take() {
+        const std::lock_guard guard(lock_);
+        return std::exchange(text_, {});
+    }
     [[nodiscard]] std::size_t count(const std::string& text) {
         const std::lock_guard guard(lock_);
         std::size_t found = 0;

@@ -65,7 +65,7 @@ TEST_F(KeyListenerTest, TheDaemonTellsOfAKeyboardThatFailsAsSoonAsItDoes) {
             .rights = DaemonUnderTest::rightsOfThisUser(),
             .listener = [&] { return std::make_unique<KeyListener>(Host::KeyMap(), *keyboard); }},
         VEXATOUCH_PLUGIN_FILE, &stream);
-    daemon.source.plug(playedSurface("7", example("taps")));
+    daemon.source.plug(playedSurface("7", "recording:" VEXA_SOURCE_DIR "/Examples/taps.json@max"));
     log.waitFor("vexatouch daemon: the keyboard is gone, no more keys are sent: ");
     // While the surface is still served.
     daemon.call([](const Tools::Daemon::Daemon& under) { EXPECT_EQ(under.surfaces(), 1U); });

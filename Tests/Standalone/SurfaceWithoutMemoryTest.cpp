@@ -12,6 +12,7 @@
 
 #include <vexa/queue.h>
 #include <cstddef>
+#include <functional>
 #include <memory>
 #include <string>
 #include <utility>
@@ -50,12 +51,17 @@ constexpr Caller kWatcher = {.right = Right::Watch, .user = 1000};
 
 class SurfaceWithoutMemoryTest : public ::testing::Test {
 protected:
-    SurfaceWithoutMemoryTest() {
+    /// Calls once the surface runs, and returns when everything that was asked has been answered.
+    void whenRunning(const std::function<void()>& act) {
+        const auto device = std::make_shared<Vexa::ScriptedDevice>();
         device->setFeatureReport(4, {4, 1, 2});
         PluggedSurface surface;
-        surface.open = [this] { return device; };
+        surface.open = [device] { return device; };
         SurfaceInstance::Hooks hooks;
-        hooks.onState = [this] { loop.stop(); };
+        hooks.onState = [&] {
+            EXPECT_EQ(instance->stateText(), "running");
+            act();
+        };
         hooks.onGestures = [](const Gestures&) {};
         instance = std::make_unique<SurfaceInstance>(loop, library, surface, Settings(), hooks);
         loop.run();
@@ -72,7 +78,6 @@ protected:
         });
     }
 
-    std::shared_ptr<Vexa::ScriptedDevice> device = std::make_shared<Vexa::ScriptedDevice>();
     Host::PluginLibrary library{VEXATOUCH_PLUGIN_FILE};
     EventLoop loop;
     std::unique_ptr<SurfaceInstance> instance;
@@ -81,33 +86,35 @@ protected:
 };
 
 TEST_F(SurfaceWithoutMemoryTest, ACallThatFindsNoMemoryTakesNoPlace) {
-    ASSERT_EQ(instance->stateText(), "running");
-    for (std::size_t i = 0; i < 2 * SurfaceInstance::kMostWaiting; ++i) {
-        for (const auto& [caller, key] :
-             {std::pair(kRoot, kOfTheService), std::pair(kWatcher, kOfTheDevice)}) {
-            refused = 1;
-            try {
-                ask(caller, key, "never");
-                FAIL() << "was taken";
-            } catch (const BusError& error) {
-                EXPECT_EQ(error.name(), ErrorName::kBusy);
-                EXPECT_STREQ(error.what(), "there is no memory for the call; try again");
+    whenRunning([this] {
+        for (std::size_t i = 0; i < 2 * SurfaceInstance::kMostWaiting; ++i) {
+            for (const auto& [caller, key] :
+                 {std::pair(kRoot, kOfTheService), std::pair(kWatcher, kOfTheDevice)}) {
+                refused = 1;
+                try {
+                    ask(caller, key, "never");
+                    ADD_FAILURE() << "was taken";
+                } catch (const BusError& error) {
+                    EXPECT_EQ(error.name(), ErrorName::kBusy);
+                    EXPECT_STREQ(error.what(), "there is no memory for the call; try again");
+                }
+                --open;
             }
-            --open;
         }
-    }
-    ask(kRoot, kOfTheService, "root");
-    ask(kWatcher, kOfTheDevice, "watcher");
-    loop.run();
+        ask(kRoot, kOfTheService, "root");
+        ask(kWatcher, kOfTheDevice, "watcher");
+    });
     EXPECT_THAT(answers, ElementsAre("root", "watcher"));
 }
 
 TEST_F(SurfaceWithoutMemoryTest, OneThatWaitedAndFindsNoMemoryIsToldSoAndTheNextIsAsked) {
-    ask(kWatcher, kOfTheDevice, "first");
-    ask(kWatcher, kOfTheDevice, "second");
-    ask(kWatcher, kOfTheDevice, "third");
-    refused = 1;
-    loop.run();
+    whenRunning([this] {
+        ask(kWatcher, kOfTheDevice, "first");
+        ask(kWatcher, kOfTheDevice, "second");
+        ask(kWatcher, kOfTheDevice, "third");
+        // The next that this thread hands over is the second.
+        refused = 1;
+    });
     EXPECT_THAT(answers, ElementsAre("second " + std::string(ErrorName::kBusy), "first", "third"));
 }
 

@@ -10,6 +10,17 @@
 #include <utility>
 
 namespace VexaTouch::Tools::Daemon {
+namespace {
+
+/// "2 gaps, 14 frames lost".
+std::string gapsText(const ReportCounts& counts) {
+    const auto counted = [](std::uint64_t count, const char* thing) {
+        return std::to_string(count) + ' ' + thing + (count == 1 ? "" : "s");
+    };
+    return counted(counts.gaps, "gap") + ", " + counted(counts.framesLost, "frame") + " lost";
+}
+
+}  // namespace
 
 struct Daemon::Device {
     unsigned number = 0;
@@ -82,6 +93,15 @@ void Daemon::add(PluggedSurface surface) {
     hooks.onGestures = [this, &device](const Gestures& gestures) {
         device.object->announceGestures(gestures);
         tellFailure(device);
+        if (onGestures) {
+            onGestures();
+        }
+    };
+    hooks.onGaps = [this, &device](const ReportCounts& counts) {
+        log_ << device.title() << ": so far " << gapsText(counts) << std::endl;
+        if (onChange) {
+            onChange();
+        }
     };
     if (device.listener) {
         hooks.onEvent = [&listener = *device.listener](const Vexa::HidEvent& event) {
@@ -187,10 +207,8 @@ void Daemon::taken(Device& device) {
     const ReportCounts counts = device.instance->counts();
     reportsOfGone_ += counts.reports;
     framesLostOfGone_ += counts.framesLost;
-    if (counts.gaps > 0) {
-        log_ << device.title() << ": " << counts.framesLost << " of "
-             << counts.images + counts.framesLost << " frames were lost at " << counts.gaps
-             << " place(s)" << std::endl;
+    if (counts.gaps > device.instance->gapsTold()) {
+        log_ << device.title() << ": in all " << gapsText(counts) << std::endl;
     }
     // What was asked for before the unplug and taken only afterwards is in force as well, unless
     // the surface was back before: then what was set since is.

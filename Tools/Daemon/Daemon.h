@@ -80,8 +80,10 @@ public:
     /// Of all surfaces so far.
     [[nodiscard]] std::uint64_t reports() const noexcept;
     [[nodiscard]] std::uint64_t framesLost() const noexcept;
-    /// Called when either of both has changed by a plug or its state.
+    /// Called when a surface has come, gone or changed its state, and when frames were lost.
     std::function<void()> onChange;
+    /// Called after gestures.
+    std::function<void()> onGestures;
 
 private:
     struct Device;

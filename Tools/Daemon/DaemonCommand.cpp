@@ -21,6 +21,7 @@
 #include <malloc.h>
 
 #include <array>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -101,10 +102,12 @@ std::unique_ptr<Daemon::DeviceSource> makeSource(const Arguments& arguments, Str
 std::string statusText(const Daemon::Daemon& daemon) {
     const std::size_t surfaces = daemon.surfaces();
     const std::uint64_t framesLost = daemon.framesLost();
-    const std::string lost =
-        framesLost > 0 ? ", " + std::to_string(framesLost) + " frames lost" : "";
+    const std::string lost = framesLost > 0 ? ", " + std::to_string(framesLost) +
+                                                  (framesLost == 1 ? " frame lost" : " frames lost")
+                                            : "";
     return std::to_string(surfaces) + (surfaces == 1 ? " surface, " : " surfaces, ") +
-           std::to_string(daemon.reports()) + " reports" + lost;
+           std::to_string(daemon.reports()) + (daemon.reports() == 1 ? " report" : " reports") +
+           lost;
 }
 
 /// What a large message took goes back to the system at once. Left alone, the C library keeps more
@@ -158,6 +161,13 @@ int runDaemon(const Arguments& arguments, Streams& streams) {
     });
     const auto tellStatus = [&] { Daemon::ServiceNotify::status(statusText(daemon)); };
     daemon.onChange = tellStatus;
+    // Gestures come up to a hundred times a second, and each status goes to everybody on the bus.
+    daemon.onGestures = [&, next = std::chrono::steady_clock::time_point()]() mutable {
+        if (const auto now = std::chrono::steady_clock::now(); now >= next) {
+            next = now + std::chrono::seconds(1);
+            tellStatus();
+        }
+    };
     Daemon::ServiceNotify::ready();
     tellStatus();
     const Daemon::Watchdog watchdog(loop, daemon, tellStatus);

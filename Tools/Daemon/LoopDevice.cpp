@@ -20,7 +20,9 @@ void LoopDevice::reportArrived(std::span<const std::uint8_t> report,
     if (report[0] == InputReport::Image::reportId) {
         if (InputReport::Image::parse(report.data(), report.size())) {
             increment(images_);
-            static_cast<void>(gaps_.see(report));
+            if (gaps_.see(report) && hooks_.onGap) {
+                hooks_.onGap();
+            }
         }
     } else if (report[0] == InputReport::FirmwareEvent::reportId) {
         if (InputReport::FirmwareEvent::parse(report.data(), report.size())) {
@@ -44,8 +46,8 @@ void LoopDevice::scheduled(const Vexa::RunLoop& loop, const char* mode) noexcept
         wasScheduled_ |= static_cast<bool>(loop);
     }
     changed_.notify_all();
-    if (!loop && onLeft_) {
-        onLeft_();
+    if (!loop && hooks_.onLeft) {
+        hooks_.onLeft();
     }
 }
 

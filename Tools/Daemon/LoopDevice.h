@@ -32,11 +32,16 @@ struct ReportCounts {
 /// between them; all else is the device's.
 class LoopDevice final : public ForwardingDevice {
 public:
-    /// `onLeft` is called when the device has left the loop that served it, on the thread that did
-    /// it; must not throw or block. May be empty.
-    explicit LoopDevice(std::shared_ptr<Vexa::DeviceBackend> device,
-                        std::function<void()> onLeft = {}) noexcept
-        : ForwardingDevice(std::move(device)), onLeft_(std::move(onLeft)) {}
+    /// None may throw or block; all are optional.
+    struct Hooks {
+        /// It has left the loop that served it. On the thread that did it.
+        std::function<void()> onLeft = {};
+        /// Frames are missing before an image. On the input thread.
+        std::function<void()> onGap = {};
+    };
+
+    explicit LoopDevice(std::shared_ptr<Vexa::DeviceBackend> device, Hooks hooks) noexcept
+        : ForwardingDevice(std::move(device)), hooks_(std::move(hooks)) {}
 
     void reportArrived(std::span<const std::uint8_t> report,
                        std::uint64_t timestamp) noexcept override;
@@ -66,7 +71,7 @@ public:
     [[nodiscard]] ReportCounts counts() const noexcept;
 
 private:
-    const std::function<void()> onLeft_;
+    const Hooks hooks_;
     Vexa::Mutex lock_;
     std::condition_variable_any changed_;
     bool wasScheduled_ GUARDED_BY(lock_) = false;

@@ -32,6 +32,10 @@ bool isSetting(const std::string& key) {
     return std::ranges::find(keys, key.substr(kPipelineDomain.size())) != keys.end();
 }
 
+std::chrono::nanoseconds steadyNow() {
+    return std::chrono::steady_clock::now().time_since_epoch();
+}
+
 BusError notTaken(const std::string& key) {
     return {ErrorName::kFailed, key + ": the device did not take the value"};
 }
@@ -87,6 +91,7 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
       settings_(std::move(settings)),
       hooks_(std::move(hooks)),
       times_(times),
+      gapWatch_(loop.watch(gapWake_, [this] { tellGaps(); })),
       parts_(std::make_unique<Parts>()),
       worker_(kWorkerLabel) {
     worker_.submit([this, wanted = settings_]() noexcept {
@@ -96,7 +101,13 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
             parts_->tap = std::make_shared<InputTap>();
             device = std::make_shared<LoopDevice>(
                 std::make_shared<TappedDevice>(surface_.open(), parts_->tap),
-                [this] { loop_.post([this] { lookForThread(); }); });
+                LoopDevice::Hooks{.onLeft = [this] { loop_.post([this] { lookForThread(); }); },
+                                  .onGap =
+                                      [this] {
+                                          if (steadyNow() >= nextGaps_.load()) {
+                                              gapWake_.notify();
+                                          }
+                                      }});
             parts_->registration.emplace(device);
             parts_->session = std::make_unique<Host::HostSession>(
                 library_, parts_->registration->service(),
@@ -243,6 +254,18 @@ void SurfaceInstance::takeGestures() {
     }
     gestures_ += taken.events.size();
     hooks_.onGestures(taken);
+    tellGaps();
+}
+
+void SurfaceInstance::tellGaps() {
+    const ReportCounts counts = this->counts();
+    const std::chrono::nanoseconds now = steadyNow();
+    if (counts.gaps == gapsTold_ || now < nextGaps_.load() || !hooks_.onGaps) {
+        return;
+    }
+    gapsTold_ = counts.gaps;
+    nextGaps_ = now + times_.betweenGaps;
+    hooks_.onGaps(counts);
 }
 
 void SurfaceInstance::takePlace(const Question& question) {

@@ -17,6 +17,7 @@
 #include "Tools/FileDescriptor.h"
 #include "Tools/FrameFeed.h"
 #include "Tools/InputTap.h"
+#include "Tools/WakeUp.h"
 
 #include <atomic>
 #include <chrono>
@@ -49,6 +50,8 @@ Vexa::PropertyValue::Dictionary statisticsOf(const ReportCounts& counts, std::ui
 struct SurfaceTimes {
     /// From its begin until its input thread takes reports.
     std::chrono::nanoseconds patience = std::chrono::seconds(5);
+    /// From one time that it is told of gaps to the next.
+    std::chrono::nanoseconds betweenGaps = std::chrono::seconds(10);
 };
 
 /// Gestures in their order, and how many are missing before them.
@@ -82,6 +85,8 @@ public:
         /// The state is another one.
         std::function<void()> onState;
         std::function<void(const Gestures& gestures)> onGestures;
+        /// Frames are missing that were not told of yet. May be empty.
+        std::function<void(const ReportCounts& counts)> onGaps;
         /// Each event, on the host's queue as it is delivered; must not throw.
         std::function<void(const Vexa::HidEvent& event)> onEvent;
     };
@@ -113,6 +118,8 @@ public:
     /// Those that were written and are in force.
     [[nodiscard]] const Settings& settings() const noexcept { return settings_; }
     [[nodiscard]] ReportCounts counts() const noexcept EXCLUDES(deviceLock_);
+    /// Of the gaps, those that onGaps was called for.
+    [[nodiscard]] std::uint64_t gapsTold() const noexcept { return gapsTold_; }
     [[nodiscard]] std::uint64_t gestures() const noexcept { return gestures_; }
 
     // Each throws BusError (NotRunning, Busy) or calls back later.
@@ -145,6 +152,7 @@ private:
     [[nodiscard]] bool isServed() const EXCLUDES(deviceLock_);
     void deliver(const Vexa::HidEvent& event) EXCLUDES(lock_);
     void takeGestures() EXCLUDES(lock_);
+    void tellGaps();
     struct Question {
         Caller caller = {};
         bool asksDevice = false;
@@ -182,6 +190,11 @@ private:
     std::deque<Held> held_;    // those behind it
     std::atomic<bool> ending_ = false;
     std::uint64_t gestures_ = 0;
+    std::uint64_t gapsTold_ = 0;
+    /// No gap is told of before this, on the steady clock.
+    std::atomic<std::chrono::nanoseconds> nextGaps_ = std::chrono::nanoseconds(0);
+    WakeUp gapWake_;  // by the input thread, which may not wait for memory
+    EventLoop::WatchHandle gapWatch_;
     // The worker gives it and takes it back; whoever else uses it does so under the lock, so that
     // the last reference goes on the worker: closing the device may wait.
     mutable Vexa::Mutex deviceLock_;
