@@ -27,6 +27,7 @@
 #include <regex>
 #include <string>
 #include <system_error>
+#include <utility>
 #include <vector>
 
 namespace VexaTouch::Testing {
@@ -99,6 +100,43 @@ TEST_F(DaemonProgramTest, TheStatusAndALineTellOfLostFrames) {
     EXPECT_TRUE(endedWith(daemon.end(), 0));
     EXPECT_THAT(daemon.error(), ::testing::ContainsRegex(
                                     "mixed.json@max: (so far|in all) [12] gaps?, 4 frames lost\n"));
+}
+
+TEST_F(DaemonProgramTest, WithoutUinputItSaysWhatToDoAndServesAllTheSame) {
+    setenv("VEXATOUCH_UINPUT", folder.path("uinput").c_str(), 1);
+    const std::vector<std::string> served = {"daemon", "--device", example("taps")};
+    std::vector<std::string> noKeyIsLeft = served;
+    for (const char* gesture : {"tap:1", "tap:2", "tap:3", "hold:1", "hold:2", "hold:3"}) {
+        noKeyIsLeft.insert(noKeyIsLeft.end(), {"--key", std::string(gesture) + "=none"});
+    }
+    for (const auto& [arguments, wantsKeys] :
+         {std::pair(served, true), std::pair(noKeyIsLeft, false)}) {
+        ProgramRun daemon(atBus(arguments));
+        ASSERT_TRUE(daemon.readErrorUntil(": running")) << daemon.error();
+        daemon.signal(SIGTERM);
+        EXPECT_TRUE(endedWith(daemon.end(), 0)) << daemon.error();
+        EXPECT_EQ(daemon.error().find(folder.path("uinput")) != std::string::npos, wantsKeys)
+            << daemon.error();
+        EXPECT_EQ(daemon.error().find("; going on without keys\n") != std::string::npos, wantsKeys);
+    }
+    unsetenv("VEXATOUCH_UINPUT");
+}
+
+TEST_F(DaemonProgramTest, AWrongCommandLineStartsNothing) {
+    for (const auto& [wrong, reason] :
+         std::vector<std::pair<std::vector<std::string>, std::string>>{
+             {{"--key", "tap:1=KEY_OF_NOTHING"}, "--key tap:1=KEY_OF_NOTHING: "},
+             {{"--no-keys", "--key", "tap:1=none"}, "--no-keys and --key contradict each other"},
+             {{"--match", "nothing"}, "--match: expected a vendor and a product id"},
+             {{"--match", "1:2", "--device", "sim"}, "--match is for surfaces that are plugged in"},
+             {{"--device", "hidraw"}, "--device hidraw: surfaces that are plugged in are found"}}) {
+        std::vector<std::string> arguments = {"daemon"};
+        arguments.insert(arguments.end(), wrong.begin(), wrong.end());
+        const CommandResult result = runCommand(atBus(arguments));
+        EXPECT_EQ(result.exitCode, 2) << reason;
+        EXPECT_THAT(result.error, HasSubstr(reason));
+        EXPECT_EQ(result.error.find(": running"), std::string::npos);
+    }
 }
 
 TEST_F(DaemonProgramTest, ASecondSignalEndsATakeDownThatDoesNotEnd) {

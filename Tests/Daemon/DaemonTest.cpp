@@ -7,12 +7,12 @@
 #include "Tests/Support/Touch.h"
 #include "Tests/Tools/VexatouchProgram.h"
 #include "Tools/Daemon/BusNames.h"
-#include "Tools/Daemon/LiveDevice.h"
 #include "Tools/Daemon/PropertyRules.h"
 #include "Tools/EventRecord.h"
 #include "Tools/Failure.h"
 #include "Tools/ForwardingDevice.h"
 #include "Tools/FrameFeed.h"
+#include "Tools/ObservedDevice.h"
 
 #include <gmock/gmock.h>
 
@@ -411,9 +411,22 @@ public:
 
 class DaemonGatedTest : public DaemonTest {
 protected:
+    /// Tells when each surface has been taken down.
+    class Leaver final : public Tools::Daemon::EventListener {
+    public:
+        explicit Leaver(std::counting_semaphore<>& gone) : gone_(gone) {}
+        void handle(const Vexa::HidEvent&) noexcept override {}
+        void surfaceEnding() noexcept override {}
+        void surfaceGone() noexcept override { gone_.release(); }
+
+    private:
+        std::counting_semaphore<>& gone_;
+    };
+
     /// Starts the daemon with one such surface.
     std::shared_ptr<GatedDevice> startGated() {
-        daemon.emplace(bus->address());
+        daemon.emplace(bus->address(), DaemonUnderTest::rightsOfThisUser(),
+                       [this] { return std::make_unique<Leaver>(gone); });
         client.emplace(bus->address());
         auto surface = playedSurface("7", example("taps"));
         const auto gated = std::make_shared<GatedDevice>(surface.open());
@@ -422,6 +435,10 @@ protected:
         waitForState(1, "running");
         return gated;
     }
+    // Before what it tells.
+    ~DaemonGatedTest() override { daemon.reset(); }
+
+    std::counting_semaphore<> gone{0};
 };
 
 /// More than any test asks.
@@ -451,14 +468,7 @@ TEST_F(DaemonGatedTest, ASettingThatWasUnderWayAtTheUnplugIsInForceAfterwards) {
     gated->allowed.release(kAll);
     caller.attach(loop, [&] { loop.stop(); });
     loop.run();
-    // Gone altogether once its end has been counted.
-    const auto isGone = [&] {
-        bool gone = false;
-        daemon->call([&](Tools::Daemon::Daemon& under) { gone = under.instances() == 0; });
-        return gone;
-    };
-    while (!isGone()) {
-    }
+    gone.acquire();
     daemon->source.plug(playedSurface("7", example("taps")));
     waitForState(2, "running");
     EXPECT_EQ(client->get(BusNames::devicePath(2), kHoldTimeout), PropertyValue(300U));
@@ -477,12 +487,6 @@ TEST_F(DaemonGatedTest, WhatWasSetSinceASurfaceIsBackOutlivesWhatWasUnderWay) {
     static_cast<void>(caller.ask(caller.call(BusNames::kService, BusNames::kManagerPath,
                                              BusNames::kManager, "ListDevices")));
     gated->asked.acquire();
-    const auto waitForInstances = [&](std::size_t wanted) {
-        std::size_t there = 0;
-        do {
-            daemon->call([&](Tools::Daemon::Daemon& under) { there = under.instances(); });
-        } while (there != wanted);
-    };
     daemon->source.unplug("7");
     daemon->source.plug(playedSurface("7", example("taps")));
     waitForState(2, "running");
@@ -490,9 +494,10 @@ TEST_F(DaemonGatedTest, WhatWasSetSinceASurfaceIsBackOutlivesWhatWasUnderWay) {
     daemon->source.unplug("7");
     while (!client->devices().empty()) {
     }
-    waitForInstances(1);
+    // The second one.
+    gone.acquire();
     gated->allowed.release(kAll);
-    waitForInstances(0);
+    gone.acquire();
     daemon->source.plug(playedSurface("7", example("taps")));
     waitForState(3, "running");
     EXPECT_EQ(client->get(BusNames::devicePath(3), kHoldTimeout), PropertyValue(400U));
@@ -588,6 +593,18 @@ TEST_F(DaemonTest, LostFramesAreToldWhenTheyAreMissedAndAtTheEnd) {
     }
 }
 
+/// A device that can be unplugged.
+class LiveDevice final : public Tools::ForwardingDevice {
+public:
+    using ForwardingDevice::ForwardingDevice;
+
+    Vexa::PropertyValue property(const Vexa::PropertyValue& key) noexcept override {
+        return key.asString() == Tools::ObservedDevice::kReadsOnKey
+                   ? PropertyValue(true)
+                   : ForwardingDevice::property(key);
+    }
+};
+
 /// A surface whose input thread is held once it has handled the first report.
 class HeldInputThread {
 public:
@@ -603,9 +620,7 @@ public:
 
     [[nodiscard]] Tools::Daemon::PluggedSurface surface() const {
         auto plugged = playedSurface("7", example("taps"));
-        plugged.open = [device = device] {
-            return std::make_shared<Tools::Daemon::LiveDevice>(device);
-        };
+        plugged.open = [device = device] { return std::make_shared<LiveDevice>(device); };
         return plugged;
     }
     void waitUntilHeld() { held_.get_future().get(); }
@@ -988,6 +1003,44 @@ TEST_F(DaemonTest, TheManagerTellsOfWhatComesAndGoes) {
     EXPECT_THAT(seen, ElementsAre("DeviceAdded " + first, "DeviceRemoved " + first));
 }
 
+TEST_F(DaemonTest, ListenersHearOfObjectsAndOfTheirStates) {
+    daemon.emplace(bus->address());
+    Tools::Daemon::EventLoop loop;
+    Bus watcher(bus->address());
+    std::vector<std::string> seen;
+    const auto objects = watcher.match(
+        "type='signal',interface='org.freedesktop.DBus.ObjectManager'", [&](BusMessage signal) {
+            seen.push_back(signal.member() + ' ' + signal.readObjectPath());
+            if (signal.member() == "InterfacesRemoved") {
+                loop.stop();
+            }
+        });
+    const auto states = watcher.match(
+        "type='signal',interface='org.freedesktop.DBus.Properties',member='PropertiesChanged'",
+        [&](BusMessage signal) {
+            std::string text = signal.path() + ' ' + signal.readString();
+            signal.enter('a', "{sv}");
+            while (signal.enter('e', "sv")) {
+                text += ' ' + signal.readString();
+                text += '=' + Vexa::writeJson(signal.readAnyValue());
+                signal.leave();
+            }
+            seen.push_back(text);
+            if (seen.size() == 3) {
+                daemon->source.unplug("7");
+            }
+        });
+    watcher.attach(loop, [&] { loop.stop(); });
+    auto broken = playedSurface("7", example("taps"));
+    broken.open = []() -> std::shared_ptr<Vexa::DeviceBackend> { throw Failure("no permission"); };
+    daemon->source.plug(broken);
+    loop.run();
+    const std::string changed = first + ' ' + BusNames::kDevice;
+    EXPECT_THAT(seen,
+                ElementsAre("InterfacesAdded " + first, changed + " State=\"failed\"",
+                            changed + " Reason=\"no permission\"", "InterfacesRemoved " + first));
+}
+
 TEST_F(DaemonTest, TheNameIsThereOnce) {
     daemon.emplace(bus->address());
     Tools::Daemon::EventLoop loop;
@@ -1115,6 +1168,18 @@ std::unique_ptr<Bus> connectAs(uid_t user, const std::string& address) {
         }
     }).join();
     return bus;
+}
+
+TEST_F(DaemonAccessTest, WhoMayOnlyWatchResetsNothing) {
+    client->set(first, kHoldTimeout, 300);
+    const auto stranger = connectAs(kStranger, bus->address());
+    try {
+        stranger->ask(stranger->call(BusNames::kService, first, BusNames::kDevice, "Reset"));
+        ADD_FAILURE() << "was allowed";
+    } catch (const BusError& error) {
+        EXPECT_EQ(error.name(), Tools::Daemon::ErrorName::kAccessDenied);
+    }
+    EXPECT_EQ(client->get(first, kHoldTimeout), PropertyValue(300U));
 }
 
 TEST_F(DaemonAccessTest, WhoMayOnlyWatchTakesNeitherThePlacesNorTheTimeOfOthers) {

@@ -75,8 +75,6 @@ public:
 
     /// Surfaces that are plugged in.
     [[nodiscard]] std::size_t surfaces() const noexcept;
-    /// With those that are being taken down.
-    [[nodiscard]] std::size_t instances() const noexcept { return devices_.size(); }
     /// Of all surfaces so far.
     [[nodiscard]] std::uint64_t reports() const noexcept;
     [[nodiscard]] std::uint64_t framesLost() const noexcept;

@@ -1,7 +1,6 @@
 #include "Tools/Daemon/WatchedSource.h"
 
-#include "Platform/HidrawDevice.h"
-#include "Tools/Daemon/LiveDevice.h"
+#include "Tools/HidrawSource.h"
 
 #include <memory>
 #include <utility>
@@ -19,7 +18,7 @@ PluggedSurface pluggedSurface(const Host::Surface& found) {
     surface.vendor = found.vendor;
     surface.product = found.product;
     surface.open = [node = found.node, sysPath = found.sysPath] {
-        return std::make_shared<LiveDevice>(std::make_shared<Vexa::HidrawDevice>(node, sysPath));
+        return std::make_shared<HidrawSource>(node, sysPath);
     };
     return surface;
 }
