@@ -7,6 +7,7 @@
 #include "Tools/Daemon/Daemon.h"
 #include "Tools/Daemon/EventLoop.h"
 #include "Tools/Daemon/KeyListener.h"
+#include "Tools/Daemon/LogLines.h"
 #include "Tools/Daemon/PlayedSource.h"
 #include "Tools/Daemon/ServiceNotify.h"
 #include "Tools/Daemon/Watchdog.h"
@@ -25,6 +26,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <ostream>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -128,6 +130,9 @@ int runDaemon(const Arguments& arguments, Streams& streams) {
     // Signals are set up before there is any other thread, so that none is bothered by them.
     const WakeUp wake;
     SignalWatch signals(wake);
+    // A journal or terminal that is not read holds up neither bus nor plugs nor keys.
+    Daemon::LogLines lines(streams.error);
+    std::ostream log(&lines);
     Daemon::EventLoop loop;
     const auto source = makeSource(arguments, streams);
     const bool wantsKeys = !arguments.given("--no-keys") && !map.keys().empty();
@@ -141,7 +146,7 @@ int runDaemon(const Arguments& arguments, Streams& streams) {
             return std::make_unique<Daemon::KeyListener>(map, *keyboard);
         };
     }
-    Daemon::Daemon daemon(loop, bus, library, *source, std::move(options), streams.error);
+    Daemon::Daemon daemon(loop, bus, library, *source, std::move(options), log);
     bool ending = false;
     const auto end = [&] {
         if (!std::exchange(ending, true)) {
