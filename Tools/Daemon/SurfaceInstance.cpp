@@ -91,7 +91,11 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
       settings_(std::move(settings)),
       hooks_(std::move(hooks)),
       times_(times),
-      gapWatch_(loop.watch(gapWake_, [this] { tellGaps(); })),
+      inputWatch_(loop.watch(inputWake_,
+                             [this] {
+                                 lookForThread();
+                                 tellGaps();
+                             })),
       parts_(std::make_unique<Parts>()),
       worker_(kWorkerLabel) {
     worker_.submit([this, wanted = settings_]() noexcept {
@@ -101,11 +105,11 @@ SurfaceInstance::SurfaceInstance(EventLoop& loop, const Host::PluginLibrary& lib
             parts_->tap = std::make_shared<InputTap>();
             device = std::make_shared<LoopDevice>(
                 std::make_shared<TappedDevice>(surface_.open(), parts_->tap),
-                LoopDevice::Hooks{.onLeft = [this] { loop_.post([this] { lookForThread(); }); },
+                LoopDevice::Hooks{.onLeft = [this] { inputWake_.notify(); },
                                   .onGap =
                                       [this] {
                                           if (steadyNow() >= nextGaps_.load()) {
-                                              gapWake_.notify();
+                                              inputWake_.notify();
                                           }
                                       }});
             parts_->registration.emplace(device);

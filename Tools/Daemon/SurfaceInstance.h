@@ -193,8 +193,8 @@ private:
     std::uint64_t gapsTold_ = 0;
     /// No gap is told of before this, on the steady clock.
     std::atomic<std::chrono::nanoseconds> nextGaps_ = std::chrono::nanoseconds(0);
-    WakeUp gapWake_;  // by the input thread, which may not wait for memory
-    EventLoop::WatchHandle gapWatch_;
+    WakeUp inputWake_;  // by the input thread, which needs no memory for it
+    EventLoop::WatchHandle inputWatch_;
     // The worker gives it and takes it back; whoever else uses it does so under the lock, so that
     // the last reference goes on the worker: closing the device may wait.
     mutable Vexa::Mutex deviceLock_;
