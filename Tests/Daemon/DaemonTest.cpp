@@ -842,14 +842,16 @@ public:
 
     void scheduled(const Vexa::RunLoop& loop, const char* mode) noexcept override {
         ForwardingDevice::scheduled(loop, mode);
-        if (loop) {
-            loop_ = loop;
+        if (loop && !std::exchange(isKnown_, true)) {
+            loop_.set_value(loop);
         }
     }
-    void end() { loop_.stop(); }
+    /// Once.
+    void end() { loop_.get_future().get().stop(); }
 
 private:
-    Vexa::RunLoop loop_;
+    bool isKnown_ = false;  // the input thread's
+    std::promise<Vexa::RunLoop> loop_;
 };
 
 TEST_F(DaemonTest, ASurfaceWhoseInputThreadEndsHasFailedAndIsTakenDown) {
