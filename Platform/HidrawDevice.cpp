@@ -138,12 +138,11 @@ bool HidrawDevice::isGone() const noexcept {
 }
 
 vexa_status HidrawDevice::statusOf(int error) noexcept {
+    // Of every error alone it cannot be told: an adapter's errors come through unchanged, and that
+    // of a device which is busy for a moment is no other than that of one which was unplugged.
+    // What is unplugged hangs up before its node goes and before the kernel refuses requests.
+    if (isGone()) return VEXA_STATUS_GONE;
     switch (error) {
-        case ENODEV:
-        case ENXIO:
-        case ENOENT:
-            gone_ = true;
-            return VEXA_STATUS_GONE;
         case ENOTTY:
         case ENOSYS:
         case EOPNOTSUPP:
@@ -155,8 +154,7 @@ vexa_status HidrawDevice::statusOf(int error) noexcept {
         case EPERM:
             return VEXA_STATUS_NO_RESOURCES;
         default:
-            // A device that goes while it is asked fails the transfer first.
-            return isGone() ? VEXA_STATUS_GONE : VEXA_STATUS_IO_ERROR;
+            return VEXA_STATUS_IO_ERROR;
     }
 }
 

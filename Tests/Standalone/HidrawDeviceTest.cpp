@@ -249,15 +249,22 @@ TEST_F(HidrawDeviceTest, SaysWhyAFeatureReportFailed) {
     devices_.plug(0);
     HidrawDevice device("/dev/hidraw0");
     const std::vector<std::pair<int, vexa_status>> outcomes = {
-        {EIO, VEXA_STATUS_IO_ERROR},        {EPIPE, VEXA_STATUS_IO_ERROR},
-        {ETIMEDOUT, VEXA_STATUS_IO_ERROR},  {EINVAL, VEXA_STATUS_IO_ERROR},
-        {ENOMEM, VEXA_STATUS_NO_RESOURCES}, {ENOSYS, VEXA_STATUS_UNSUPPORTED},
+        {EIO, VEXA_STATUS_IO_ERROR},
+        {EPIPE, VEXA_STATUS_IO_ERROR},
+        {ETIMEDOUT, VEXA_STATUS_IO_ERROR},
+        {EINVAL, VEXA_STATUS_IO_ERROR},
+        {ENOMEM, VEXA_STATUS_NO_RESOURCES},
+        {ENOSYS, VEXA_STATUS_UNSUPPORTED},
+        // An address on a bus that did not answer, a transfer that was taken back.
+        {ENXIO, VEXA_STATUS_IO_ERROR},
+        {ENOENT, VEXA_STATUS_IO_ERROR},
+        {ENODEV, VEXA_STATUS_IO_ERROR},
     };
     for (const auto& [error, status] : outcomes) {
         devices_.setFeature(0, 4, {.bytes = {}, .error = error});
         EXPECT_EQ(featureOf(device, 4), (Answer{status, {}})) << error;
+        EXPECT_FALSE(device.isGone()) << error;
     }
-    EXPECT_FALSE(device.isGone());
     devices_.setFeature(0, 4, {.bytes = {4, 1, 2}});
     EXPECT_EQ(featureOf(device, 4), (Answer{VEXA_STATUS_SUCCESS, {4, 1, 2}}));
 
@@ -265,9 +272,18 @@ TEST_F(HidrawDeviceTest, SaysWhyAFeatureReportFailed) {
     std::size_t length = 8;
     EXPECT_EQ(device.getReport(VEXA_REPORT_INPUT, 1, buffer, length), VEXA_STATUS_UNSUPPORTED);
     EXPECT_EQ(length, 0U);
+}
 
-    devices_.setFeature(0, 4, {.bytes = {}, .error = ENODEV});
-    EXPECT_EQ(featureOf(device, 4), (Answer{VEXA_STATUS_GONE, {}}));
+TEST_F(HidrawDeviceTest, ARequestThatEndsWithTheUnplugSaysGone) {
+    devices_.plug(0);
+    HidrawDevice device("/dev/hidraw0");
+    devices_.holdNextFeature(0);
+    Answer answer;
+    std::jthread asking([&] { answer = featureOf(device, 4); });
+    devices_.waitUntilHeld(0);
+    devices_.unplug(0);
+    asking.join();
+    EXPECT_EQ(answer, (Answer{VEXA_STATUS_GONE, {}}));
     EXPECT_TRUE(device.isGone());
 }
 

@@ -126,7 +126,8 @@ public:
         }
         unplug(number);
     }
-    /// Pulls the plug: readers hang up, ioctls fail, the folders in /sys go, then comes the event.
+    /// Pulls the plug: readers hang up, ioctls fail, one that waits for its answer too, the folders
+    /// in /sys go, then comes the event.
     void unplug(unsigned number, bool announced = true) {
         Device& device = *devices_.at(number);
         {
@@ -135,6 +136,7 @@ public:
         }
         ::close(std::exchange(device.terminal, -1));
         removeNode("hidraw" + std::to_string(number));
+        if (device.heldClient) answerHeld(number);
         umockdev_testbed_detach_ioctl(testbed_, nodeOf(number).c_str(), nullptr);
         if (announced) umockdev_testbed_uevent(testbed_, device.sysPath.c_str(), "remove");
         umockdev_testbed_remove_device(testbed_, device.sysPath.c_str());
