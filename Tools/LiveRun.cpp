@@ -191,13 +191,16 @@ void LiveRun::keep() {
         // Whatever it was, it may be something for the other as well.
         work_.notify();
     }
+    // A key that is held repeats until it is released, and both of these may take seconds: last
+    // reports that nobody takes, a node whose closing waits for a request.
+    releaseKeys();
     if (unplugged_) {
         waitForLastReports();
+        releaseKeys();
     }
     session_.halt();
-    if (keys_) {
-        keys_->releaseAll();
-    }
+    // Events may have come until then.
+    releaseKeys();
     halted_ = true;
     work_.notify();
 }
@@ -218,6 +221,12 @@ void LiveRun::waitForLastReports() {
     LastReports last(*device_, session_, streams_.patience);
     while (!last.areTaken() && !signals_.endWanted()) {
         wake_.wait(std::chrono::steady_clock::now() + LastReports::kInterval);
+    }
+}
+
+void LiveRun::releaseKeys() noexcept {
+    if (keys_) {
+        keys_->releaseAll();
     }
 }
 

@@ -96,6 +96,7 @@ private:
     void waitForEnd();
     void waitForLastReports();
     void lookAfterReports();
+    void releaseKeys() noexcept;
 
     // The thread that runs it.
     void runToEnd();

@@ -322,6 +322,50 @@ TEST_F(LiveRunTest, SignalReleasesTheKeyWhileNobodyReadsTheOutput) {
     EXPECT_THAT(result.out, HasSubstr("hold-start"));
 }
 
+/// A device that takes its time to close, as one of the kernel does while a request is waited for:
+/// until `released`, or so long that a test has failed.
+class SlowToClose final : public PlayedDevice {
+public:
+    SlowToClose(FrameSource plays, std::future<void> released)
+        : PlayedDevice(std::move(plays), Tools::PlayedPace{.speed = kAsFastAsTaken},
+                       Tools::SurfaceIdentity{}, Vexa::HostClock::system()),
+          released_(std::move(released)) {}
+
+    void close(std::uint32_t options) noexcept override {
+        wasReleased_ = released_.wait_for(std::chrono::minutes(1)) == std::future_status::ready;
+        PlayedDevice::close(options);
+    }
+    /// Whether the key was up before it had closed.
+    [[nodiscard]] bool wasReleased() const { return wasReleased_; }
+
+private:
+    std::future<void> released_;
+    bool wasReleased_ = false;
+};
+
+TEST_F(LiveRunTest, KeyIsReleasedBeforeTheDeviceIsWaitedFor) {
+    for (const bool unplugs : {false, true}) {
+        std::promise<void> released;
+        keyboard =
+            std::make_unique<Host::SharedKeyboard>(std::make_unique<ReleaseToldOf>(released));
+        SlowToClose* played = nullptr;
+        const auto device = std::make_shared<SlowToClose>(upToTheFirstHold(framesOf("holds"),
+                                                                           [&] {
+                                                                               if (unplugs) {
+                                                                                   played->unplug();
+                                                                               }
+                                                                           }),
+                                                          released.get_future());
+        played = device.get();
+        if (unplugs) {
+            EXPECT_THROW(run(device), Tools::Failure);
+        } else {
+            run(device);
+        }
+        EXPECT_TRUE(device->wasReleased()) << unplugs;
+    }
+}
+
 TEST_F(LiveRunTest, EventsBeyondTheRoomAreCountedAndTheRunFails) {
     std::promise<void> enough;
     UnreadOutput unread(enough.get_future());
