@@ -94,4 +94,8 @@ void HidrawSource::reportHandled() noexcept {
     }
 }
 
+void HidrawSource::scheduled(const Vexa::RunLoop& loop, const char* /*mode*/) noexcept {
+    isServed_.store(static_cast<bool>(loop));
+}
+
 }  // namespace VexaTouch::Tools

@@ -23,6 +23,7 @@ public:
     [[nodiscard]] std::string tally() const override;
     [[nodiscard]] std::uint64_t sent() const noexcept override { return read_.load(); }
     [[nodiscard]] std::uint64_t handled() const noexcept override { return handled_.load(); }
+    [[nodiscard]] bool isServed() const noexcept override { return isServed_.load(); }
 
     vexa_status open(std::uint32_t options, int& descriptor) noexcept override;
     vexa_status getReport(vexa_report_type type, std::uint32_t reportId,
@@ -33,12 +34,14 @@ public:
     void reportArrived(std::span<const std::uint8_t> report,
                        std::uint64_t timestamp) noexcept override;
     void reportHandled() noexcept override;
+    void scheduled(const Vexa::RunLoop& loop, const char* mode) noexcept override;
 
 private:
     Vexa::HidrawDevice device_;
     DeviceHooks hooks_;
     std::atomic<std::uint64_t> read_{0};
     std::atomic<std::uint64_t> handled_{0};
+    std::atomic<bool> isServed_{false};
 };
 
 }  // namespace VexaTouch::Tools

@@ -52,6 +52,9 @@ public:
     /// those that the service is done with. Any thread.
     [[nodiscard]] virtual std::uint64_t sent() const noexcept = 0;
     [[nodiscard]] virtual std::uint64_t handled() const noexcept = 0;
+    /// Whether somebody is there to read a live device: a report that is not read is not known of
+    /// otherwise. A played device knows what it has sent: always true. Any thread.
+    [[nodiscard]] virtual bool isServed() const noexcept { return true; }
     /// What became of the reports of the latest opening: "12 reports sent, 0 dropped".
     [[nodiscard]] virtual std::string tally() const = 0;
 };

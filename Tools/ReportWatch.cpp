@@ -7,7 +7,9 @@ namespace VexaTouch::Tools {
 bool ReportWatch::look() noexcept {
     const std::uint64_t handled = device_.handled();
     const bool anyHandled = std::exchange(handled_, handled) != handled;
-    const bool anyWaiting = device_.sent() > handled;
+    // What a live device has for a service that does not read it cannot be seen; that none does
+    // can.
+    const bool anyWaiting = device_.sent() > handled || !device_.isServed();
     inVain_ = anyWaiting && !anyHandled ? inVain_ + 1 : 0;
     return inVain_ >= kLooks;
 }

@@ -8,7 +8,7 @@
 namespace VexaTouch::Tools {
 
 /// Finds out that a service does not take the reports of its device: its input thread may not have
-/// started, or be stuck, of which a host sees nothing else.
+/// started, or have ended, or be stuck, of which a host sees nothing else.
 ///
 /// Looks are counted and not time, so that a process that was held for a while does not give up
 /// when it goes on. One watch for each opening of the device; one thread.
@@ -17,7 +17,8 @@ public:
     /// What a host says of such a service.
     static constexpr const char* kFault = "the service takes no reports; its log says why";
 
-    /// `patience` is how long reports may wait while none is handled. The device must outlive the
+    /// `patience` is how long reports may wait, or a live device be read by nobody, while no report
+    /// is handled. The device must outlive the
     /// watch.
     ReportWatch(const ObservedDevice& device, std::chrono::nanoseconds patience) noexcept
         : device_(device), interval_(patience / kLooks) {}
@@ -25,8 +26,8 @@ public:
     /// The time from one look to the next.
     [[nodiscard]] std::chrono::nanoseconds interval() const noexcept { return interval_; }
 
-    /// To be called once in each interval. True when reports have been waiting in vain for so many
-    /// looks in a row that the patience is at its end.
+    /// To be called once in each interval. True when reports have been waiting in vain, or nobody
+    /// has been there to read them, for so many looks in a row that the patience is at its end.
     [[nodiscard]] bool look() noexcept;
 
 private:

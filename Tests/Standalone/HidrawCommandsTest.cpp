@@ -1,11 +1,14 @@
 // A process of its own, since /sys, /dev and system calls are replaced by made-up ones.
 
+#include "Platform/HidDevice.h"
 #include "Platform/Json.h"
 #include "Platform/Log.h"
 #include "Platform/TraceListener.h"
 #include "Shared/InputReport.h"
+#include "Tests/Platform/LoopThread.h"
 #include "Tests/Support/MockedDevices.h"
 #include "Tests/Tools/CommandRun.h"
+#include "Tools/HidrawSource.h"
 #include "Tools/RecordingFile.h"
 
 #include <gmock/gmock.h>
@@ -18,6 +21,7 @@
 #include <cstdlib>
 #include <future>
 #include <iostream>
+#include <memory>
 #include <string>
 #include <utility>
 #include <vector>
@@ -294,6 +298,36 @@ TEST_F(HidrawCommandsTest, AFloodOfInvalidReportsIsNotToldOneByOne) {
     EXPECT_EQ(result.out, "");
     EXPECT_EQ(result.error,
               "2000 reports read, 0 events\nvexatouch run: the device was unplugged\n");
+}
+
+TEST_F(HidrawCommandsTest, AServiceThatNeverReadsTheSurfaceEndsTheCommand) {
+    setenv("VEXATOUCH_PLUGIN", VEXATOUCH_SAMPLE_PLUGINS "/TakesNoReports.so", 1);
+    devices_.plug(0);
+    const TemporaryFolder folder;
+    const std::string file = folder.path("session.json");
+    for (const std::vector<std::string>& arguments :
+         {std::vector<std::string>{"run"}, {"record", file}, {"latency", "--reader", "off"}}) {
+        std::vector<std::string> onSurface = arguments;
+        onSurface.insert(onSurface.end(), {"--device", "hidraw"});
+        const CommandResult result =
+            runCommand(onSurface, {}, Vexa::HostClock::system(), std::chrono::milliseconds(10));
+        EXPECT_EQ(result.exitCode, 1) << result;
+        EXPECT_THAT(result.error, HasSubstr("vexatouch " + arguments.front() +
+                                            ": the service takes no reports; its log says why"));
+    }
+}
+
+TEST_F(HidrawCommandsTest, ASurfaceKnowsWhetherItIsRead) {
+    devices_.plug(0);
+    const auto source = std::make_shared<Tools::HidrawSource>("/dev/hidraw0");
+    EXPECT_FALSE(source->isServed());
+    const Vexa::DeviceRegistration registration(source);
+    const Vexa::HidDevice device = Vexa::HidDevice::create(registration.service());
+    Vexa::LoopThread thread;
+    thread.call([&] { device.schedule(thread.loop(), Vexa::LoopThread::kMode); });
+    EXPECT_TRUE(source->isServed());
+    thread.call([&] { device.unschedule(thread.loop(), Vexa::LoopThread::kMode); });
+    EXPECT_FALSE(source->isServed());
 }
 
 TEST_F(HidrawCommandsTest, NoSurfaceIsAClearFailure) {

@@ -5,7 +5,10 @@
 #include <gtest/gtest.h>
 
 #include <chrono>
+#include <cstdint>
 #include <list>
+#include <optional>
+#include <string>
 #include <thread>
 
 namespace VexaTouch::Tools {
@@ -67,6 +70,72 @@ TEST_F(ReportWatchTest, AServiceThatHasTakenAllIsNotWaitedFor) {
     for (int look = 0; look < 10 * kLooks; ++look) {
         EXPECT_FALSE(watch.look());
     }
+}
+
+/// A live device: of what it has nothing is known but what was read.
+class LiveDevice final : public ObservedDevice {
+public:
+    void setHooks(DeviceHooks) override {}
+    [[nodiscard]] std::uint64_t sent() const noexcept override { return read; }
+    [[nodiscard]] std::uint64_t handled() const noexcept override { return done; }
+    [[nodiscard]] bool isServed() const noexcept override { return served; }
+    [[nodiscard]] std::string tally() const override { return {}; }
+    vexa_status open(std::uint32_t, int&) noexcept override { return VEXA_STATUS_UNSUPPORTED; }
+
+    std::uint64_t read = 0;
+    std::uint64_t done = 0;
+    bool served = false;
+};
+
+/// How many looks it takes to give up; none: more than any patience.
+std::optional<int> looksInVain(ReportWatch& watch) {
+    for (int look = 1; look <= 10 * kLooks; ++look) {
+        if (watch.look()) {
+            return look;
+        }
+    }
+    return std::nullopt;
+}
+
+TEST(ReportWatchOfALiveDeviceTest, OneThatNobodyReadsEndsThePatience) {
+    LiveDevice device;
+    ReportWatch watch(device, std::chrono::seconds(5));
+    EXPECT_EQ(looksInVain(watch), kLooks);
+}
+
+TEST(ReportWatchOfALiveDeviceTest, OneThatSendsNothingIsWaitedFor) {
+    LiveDevice device;
+    device.served = true;
+    ReportWatch watch(device, std::chrono::seconds(5));
+    EXPECT_EQ(looksInVain(watch), std::nullopt);
+    device.read = 7;
+    device.done = 7;
+    EXPECT_EQ(looksInVain(watch), std::nullopt);
+}
+
+TEST(ReportWatchOfALiveDeviceTest, AReaderThatStartsInTimeOrEndsLaterIsSeen) {
+    LiveDevice device;
+    ReportWatch watch(device, std::chrono::seconds(5));
+    for (int look = 1; look < kLooks; ++look) {
+        EXPECT_FALSE(watch.look());
+    }
+    device.served = true;
+    EXPECT_EQ(looksInVain(watch), std::nullopt);
+    device.read = 3;
+    device.done = 3;
+    EXPECT_FALSE(watch.look());
+    device.served = false;
+    EXPECT_EQ(looksInVain(watch), kLooks);
+}
+
+TEST(ReportWatchOfALiveDeviceTest, AReportThatIsNotDoneWithEndsThePatience) {
+    LiveDevice device;
+    device.served = true;
+    device.read = 4;
+    device.done = 3;
+    ReportWatch watch(device, std::chrono::seconds(5));
+    EXPECT_FALSE(watch.look());  // three of them were handled before it
+    EXPECT_EQ(looksInVain(watch), kLooks);
 }
 
 }  // namespace
