@@ -1,6 +1,7 @@
 #include "Host/SurfaceWatch.h"
 
 #include "Host/HostFailure.h"
+#include "Platform/Log.h"
 #include "Platform/ReportDescriptor.h"
 
 #include <fcntl.h>
@@ -13,6 +14,7 @@
 #include <cstdio>
 #include <cstring>
 #include <optional>
+#include <set>
 #include <string_view>
 #include <utility>
 
@@ -65,45 +67,103 @@ bool isTold(const std::vector<SurfaceChange>& changes, std::string_view sysPath)
     });
 }
 
-/// Empty when it cannot be read, as that of a device that has gone.
-std::vector<std::uint8_t> readDescriptor(const std::string& path) {
-    std::vector<std::uint8_t> bytes;
-    const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
-    if (file < 0) return bytes;
-    std::array<std::uint8_t, Vexa::kLongestReportDescriptor> piece{};
-    ssize_t count = 0;
-    while ((count = ::read(file, piece.data(), piece.size())) > 0 &&
-           bytes.size() <= Vexa::kLongestReportDescriptor) {
-        bytes.insert(bytes.end(), piece.begin(), piece.begin() + count);
+void logError(const std::string& text) {
+    Vexa::Log(Vexa::LogCategory::HIDService).write(Vexa::LogLevel::Error, text);
+}
+
+/// Whether it is this process that lacks something, and nothing was learned of a device.
+bool isShortage(int error) {
+    return error == EMFILE || error == ENFILE || error == ENOMEM;
+}
+
+/// Why nothing can be learned of any device just now; 0: there are descriptors. What the library
+/// could not read of a device for want of one it takes for not being there, and does not say why.
+int shortageNow() {
+    // More than it ever holds open at once.
+    std::array<int, 6> some{};
+    some.fill(-1);
+    int error = 0;
+    for (int& any : some) {
+        any = ::open("/", O_PATH | O_DIRECTORY | O_CLOEXEC);
+        if (any >= 0) continue;
+        error = isShortage(errno) ? errno : 0;
+        break;
     }
-    ::close(file);
+    for (const int any : some) {
+        if (any >= 0) ::close(any);
+    }
+    return error;
+}
+
+/// Empty when it cannot be read; then `error` is why, or 0 when the device has gone.
+std::vector<std::uint8_t> readDescriptor(const std::string& path, int& error) {
+    std::vector<std::uint8_t> bytes;
+    error = 0;
+    const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    if (file < 0) {
+        error = errno;
+    } else {
+        std::array<std::uint8_t, Vexa::kLongestReportDescriptor> piece{};
+        ssize_t count = 0;
+        while ((count = ::read(file, piece.data(), piece.size())) > 0 &&
+               bytes.size() <= Vexa::kLongestReportDescriptor) {
+            bytes.insert(bytes.end(), piece.begin(), piece.begin() + count);
+        }
+        if (count < 0) {
+            error = errno;
+            bytes.clear();
+        }
+        ::close(file);
+    }
+    if (error == ENOENT || error == ENODEV) error = 0;
     return bytes;
 }
 
-/// What the kernel's HID device above a hidraw node says of itself; nothing when either has gone.
-std::optional<Surface> surfaceOf(udev_device* device) {
+/// What stays the same of a device that is plugged in again, perhaps elsewhere. Of one with several
+/// interfaces, which share the ids and the serial number, the end of the path tells which it is.
+std::string identityOf(const Surface& surface) {
+    const std::string& path = surface.physicalPath;
+    const std::size_t slash = path.rfind('/');
+    return std::to_string(surface.vendor) + ':' + std::to_string(surface.product) + ' ' +
+           surface.serial + (slash == std::string::npos ? std::string() : path.substr(slash));
+}
+
+}  // namespace
+
+/// What looking at a device has shown.
+struct SurfaceWatch::Look {
+    /// Nothing when the device has gone, or could not be looked at.
+    std::optional<Surface> surface = std::nullopt;
+    /// Why something was not learned: with a surface, of its report descriptor.
+    int error = 0;
+};
+
+/// What the kernel's HID device above a hidraw node says of itself.
+SurfaceWatch::Look SurfaceWatch::lookAt(udev_device* device) {
     const char* const node = udev_device_get_devnode(device);
     udev_device* const hid = udev_device_get_parent_with_subsystem_devtype(device, "hid", nullptr);
-    if (node == nullptr || hid == nullptr) return std::nullopt;
+    if (node == nullptr || hid == nullptr) return {.error = shortageNow()};
+    int error = 0;
     Surface surface{.node = node,
                     .sysPath = textOf(udev_device_get_syspath(device)),
                     .name = propertyOf(hid, "HID_NAME"),
                     .physicalPath = propertyOf(hid, "HID_PHYS"),
                     .serial = propertyOf(hid, "HID_UNIQ"),
-                    .reportDescriptor = readDescriptor(textOf(udev_device_get_syspath(hid)) +
-                                                       "/report_descriptor")};
+                    .reportDescriptor = readDescriptor(
+                        textOf(udev_device_get_syspath(hid)) + "/report_descriptor", error)};
+    if (isShortage(error)) return {.error = error};
     unsigned bus = 0;
     unsigned vendor = 0;
     unsigned product = 0;
     const std::string ids = propertyOf(hid, "HID_ID");  // "0003:00005658:00005454"
-    if (std::sscanf(ids.c_str(), "%x:%x:%x", &bus, &vendor, &product) != 3) return std::nullopt;
+    if (std::sscanf(ids.c_str(), "%x:%x:%x", &bus, &vendor, &product) != 3) {
+        return {.error = shortageNow()};
+    }
     surface.bus = bus;
     surface.vendor = static_cast<std::uint16_t>(vendor);
     surface.product = static_cast<std::uint16_t>(product);
-    return surface;
+    return {.surface = std::move(surface), .error = error};
 }
-
-}  // namespace
 
 class SurfaceWatch::Udev {
 public:
@@ -130,20 +190,26 @@ public:
         return Device(udev_monitor_receive_device(monitor_.get()));
     }
 
-    /// Calls `found` with each device that is there and ready for use.
-    template <typename Found>
-    void list(Found&& found) const {
+    /// Calls `found` with each device that is there and ready for use, and `missed` with the path
+    /// in /sys of each that could not be looked at. Why the list could not be made, or 0.
+    template <typename Found, typename Missed>
+    [[nodiscard]] int list(Found&& found, Missed&& missed) const {
         const Enumeration enumeration(udev_enumerate_new(context_.get()));
-        if (!enumeration) fail("devices cannot be listed", errno);
+        if (!enumeration) return errno;
         int error = udev_enumerate_add_match_subsystem(enumeration.get(), kSubsystem);
         if (error >= 0) error = udev_enumerate_scan_devices(enumeration.get());
-        if (error < 0) fail("devices cannot be listed", -error);
+        if (error < 0) return -error;
         udev_list_entry* entry = nullptr;
         udev_list_entry_foreach(entry, udev_enumerate_get_list_entry(enumeration.get())) {
-            const Device device(
-                udev_device_new_from_syspath(context_.get(), udev_list_entry_get_name(entry)));
-            if (device && isReady(device.get())) found(device.get());
+            const char* const path = udev_list_entry_get_name(entry);
+            const Device device(udev_device_new_from_syspath(context_.get(), path));
+            if (device && isReady(device.get())) {
+                found(device.get());
+            } else if (const int shortage = shortageNow()) {
+                missed(path, shortage);
+            }
         }
+        return 0;
     }
 
 private:
@@ -179,20 +245,70 @@ std::vector<SurfaceChange> SurfaceWatch::takeChanges() {
     std::vector<SurfaceChange> changes;
     if (std::exchange(mustEnumerate_, false)) enumerate(changes);
     takeEvents(changes);
-    // Events were lost: what they told is in a new list.
-    if (std::exchange(mustEnumerate_, false)) enumerate(changes);
+    // Events were lost: what they told is in a new list. What cannot be looked at now can be no
+    // more a moment later.
+    if (!isShort_ && std::exchange(mustEnumerate_, false)) enumerate(changes);
     return changes;
+}
+
+void SurfaceWatch::lookLater(int error) {
+    mustEnumerate_ = true;
+    if (std::exchange(isShort_, true)) return;
+    logError(std::string("HID devices cannot be looked at: ") + std::strerror(error) +
+             "; what is known stays, the others are looked at with the next news of a device");
+}
+
+bool SurfaceWatch::isSurface(const Look& look) {
+    const Surface& surface = *look.surface;
+    if (look.error != 0) {
+        logError(surface.node +
+                 ": its report descriptor cannot be read: " + std::strerror(look.error));
+    }
+    if (match_.matches(surface)) {
+        former_.insert_or_assign(identityOf(surface), false);
+        return true;
+    }
+    const std::string identity = identityOf(surface);
+    // What is still there is another device.
+    const bool isThere = std::ranges::any_of(
+        known_, [&](const auto& known) { return identityOf(known.second) == identity; });
+    const auto former = former_.find(identity);
+    if (!isThere && former != former_.end() && !std::exchange(former->second, true)) {
+        logError(surface.node + ": no surface any more: " + match_.reason(surface));
+    }
+    return false;
 }
 
 void SurfaceWatch::enumerate(std::vector<SurfaceChange>& changes) {
     std::vector<Surface> present;
-    udev_->list([&](udev_device* device) {
-        if (auto surface = surfaceOf(device); surface && match_.matches(*surface)) {
-            present.push_back(*std::move(surface));
-        }
-    });
+    std::set<std::string, std::less<>> unclear;
+    int shortage = 0;
+    const auto missed = [&](std::string path, int error) {
+        unclear.insert(std::move(path));
+        if (isShortage(error)) shortage = error;
+    };
+    const int failure = udev_->list(
+        [&](udev_device* device) {
+            Look look = lookAt(device);
+            const std::string path = textOf(udev_device_get_syspath(device));
+            if (look.error != 0 && (!look.surface || known_.contains(path))) {
+                missed(path, look.error);
+            } else if (look.surface && isSurface(look)) {
+                present.push_back(*std::move(look.surface));
+            }
+        },
+        missed);
+    if (failure != 0) {
+        if (!hasEnumerated_ || !isShortage(failure)) fail("devices cannot be listed", failure);
+        lookLater(failure);
+        return;
+    }
+    hasEnumerated_ = true;
+    isShort_ = isShort_ && shortage != 0;
+    if (shortage != 0) lookLater(shortage);
     std::erase_if(known_, [&](const auto& known) {
-        const bool isThere = std::ranges::find(present, known.second) != present.end();
+        const bool isThere = unclear.contains(known.first) ||
+                             std::ranges::find(present, known.second) != present.end();
         if (!isThere) changes.push_back({SurfaceChange::Kind::Removed, known.second});
         return !isThere;
     });
@@ -224,10 +340,11 @@ void SurfaceWatch::takeEvents(std::vector<SurfaceChange>& changes) {
             changes.push_back({SurfaceChange::Kind::Removed, std::move(known->second)});
             known_.erase(known);
         } else if (known == known_.end()) {
-            auto surface = surfaceOf(device.get());
-            if (!surface || !match_.matches(*surface)) continue;
-            known_.emplace(path, *surface);
-            changes.push_back({SurfaceChange::Kind::Added, *std::move(surface)});
+            Look look = lookAt(device.get());
+            if (!look.surface && look.error != 0) lookLater(look.error);
+            if (!look.surface || !isSurface(look)) continue;
+            known_.emplace(path, *look.surface);
+            changes.push_back({SurfaceChange::Kind::Added, *std::move(look.surface)});
         } else if (action != nullptr && isNews(action) && !isTold(changes, path)) {
             changes.push_back({SurfaceChange::Kind::Changed, known->second});
         }

@@ -2,6 +2,8 @@
 
 #include "Host/SurfaceWatch.h"
 
+#include "Tests/Support/FewDescriptors.h"
+#include "Tests/Support/LogCapture.h"
 #include "Tests/Support/MockedDevices.h"
 
 #include <gmock/gmock.h>
@@ -144,6 +146,98 @@ TEST_P(SurfaceWatchTest, ADescriptorThatChangesAtReplugIsLookedAtAnew) {
     devices_.unplug(0);
     const std::string after = devices_.plug(0, ours_);
     EXPECT_THAT(nextChanges(watch), ElementsAre(SurfaceChange{kAdded, surfaceOf(ours_, 0, after)}));
+}
+
+TEST_P(SurfaceWatchTest, ASurfaceThatIsNoneAnyMoreIsToldOfOnceWithTheReason) {
+    LogCapture log;
+    SurfaceWatch watch(SurfaceMatch(), GetParam());
+    EXPECT_THAT(watch.takeChanges(), IsEmpty());
+    const auto plugAndPull = [&](const MockedIdentity& identity) {
+        devices_.plug(0, identity);
+        const auto changes = nextChanges(watch);
+        devices_.unplug(0);
+        nextChanges(watch);
+        return changes.size();
+    };
+    MockedIdentity ours = ours_;
+    ours.physicalPath = "port-1/input1";
+    MockedIdentity updated = ours;
+    updated.physicalPath = "port-2/input1";
+    updated.descriptor = kNoReports;
+    MockedIdentity anotherInterface = updated;
+    anotherInterface.physicalPath = "port-1/input0";
+    MockedIdentity anotherUnit = updated;
+    anotherUnit.serial = "0002";
+    const auto told = ElementsAre(
+        error("/dev/hidraw0: no surface any more: no input report 1; no input report 2; no "
+              "feature report 4; no feature report 31; no feature report 63"));
+
+    EXPECT_EQ(plugAndPull(updated), 0U);
+    EXPECT_THAT(log.take(), IsEmpty()) << "it never was one";
+    EXPECT_EQ(plugAndPull(ours), 1U);
+    EXPECT_EQ(plugAndPull(anotherInterface), 0U);
+    EXPECT_EQ(plugAndPull(anotherUnit), 0U);
+    EXPECT_THAT(log.take(), IsEmpty());
+    EXPECT_EQ(plugAndPull(updated), 0U);
+    EXPECT_THAT(log.take(), told);
+    EXPECT_EQ(plugAndPull(updated), 0U);
+    EXPECT_THAT(log.take(), IsEmpty());
+    EXPECT_EQ(plugAndPull(ours), 1U);
+    EXPECT_EQ(plugAndPull(updated), 0U);
+    EXPECT_THAT(log.take(), told);
+}
+
+TEST_P(SurfaceWatchTest, WithoutDescriptorsASurfaceThatComesIsFoundLater) {
+    // Each is missing at another place.
+    for (rlim_t left = 0; left < 6; ++left) {
+        SCOPED_TRACE(left);
+        MockedDevices devices;
+        LogCapture log;
+        SurfaceWatch watch(SurfaceMatch(), GetParam());
+        EXPECT_THAT(watch.takeChanges(), IsEmpty());
+        const Surface surface = surfaceOf(ours_, 3, devices.plug(3, ours_));
+        std::vector<SurfaceChange> changes;
+        {
+            const FewDescriptors few(left);
+            changes = nextChanges(watch);
+            const auto again = watch.takeChanges();
+            changes.insert(changes.end(), again.begin(), again.end());
+        }
+        if (left == 0) {
+            EXPECT_THAT(changes, IsEmpty());
+        }
+        if (changes.empty()) {
+            EXPECT_THAT(log.take(),
+                        ElementsAre(error("HID devices cannot be looked at: Too many open files; "
+                                          "what is known stays, the others are looked at with "
+                                          "the next news of a device")));
+        }
+        devices.plug(0, {.name = "Keyboard", .serial = "K", .descriptor = kNoReports});
+        const auto later = nextChanges(watch);
+        changes.insert(changes.end(), later.begin(), later.end());
+        EXPECT_THAT(changes, ElementsAre(SurfaceChange{kAdded, surface}));
+        EXPECT_THAT(log.take(), IsEmpty());
+    }
+}
+
+TEST_P(SurfaceWatchTest, WithoutDescriptorsWhatIsKnownStays) {
+    for (rlim_t left = 0; left < 6; ++left) {
+        SCOPED_TRACE(left);
+        MockedDevices devices;
+        LogCapture log;
+        const Surface surface = surfaceOf(ours_, 0, devices.plug(0, ours_));
+        SurfaceWatch watch(SurfaceMatch(), GetParam());
+        EXPECT_EQ(watch.takeChanges().size(), 1U);
+        {
+            const FewDescriptors few(left);
+            overflows = true;
+            EXPECT_THAT(watch.takeChanges(), IsEmpty());
+            EXPECT_THAT(watch.takeChanges(), IsEmpty());
+        }
+        EXPECT_LE(log.take().size(), 1U);
+        devices.unplug(0);
+        EXPECT_THAT(nextChanges(watch), ElementsAre(SurfaceChange{kRemoved, surface}));
+    }
 }
 
 TEST_P(SurfaceWatchTest, AnEventOfADeviceThatHasGoneAgainIsNothing) {
