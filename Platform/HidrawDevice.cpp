@@ -1,5 +1,7 @@
 #include "Platform/HidrawDevice.h"
 
+#include "Platform/Log.h"
+
 #include <fcntl.h>
 #include <linux/hidraw.h>
 #include <linux/input.h>
@@ -10,6 +12,9 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstring>
 #include <new>
 #include <system_error>
 #include <utility>
@@ -54,6 +59,17 @@ std::string textOf(int descriptor, unsigned long code) {
     if (request(descriptor, code, text.data()) < 0) return {};
     const auto end = std::ranges::find(text, '\0');
     return {text.begin(), end};
+}
+
+[[gnu::format(printf, 2, 3)]] void logLine(LogLevel level, const char* format, ...) noexcept {
+    const Log log(LogCategory::HIDService);
+    if (!log.isEnabled(level)) return;
+    std::array<char, 256> text{};
+    va_list arguments;
+    va_start(arguments, format);
+    std::vsnprintf(text.data(), text.size(), format, arguments);
+    va_end(arguments);
+    log.write(level, text.data());
 }
 
 std::string_view transportOf(std::uint32_t bus) noexcept {
@@ -128,6 +144,12 @@ void HidrawDevice::readProperties() {
     put(HidrawKey::kReportDescriptor, PropertyValue::Bytes(bytes.begin(), bytes.end()));
     put(HidrawKey::kMaxInputReportSize,
         descriptor ? descriptor->longest(ReportKind::Input) : std::size_t{0});
+    if (!descriptor) return;
+    for (const ReportDescriptor::Report& report : descriptor->reports) {
+        if (report.kind != ReportKind::Feature) continue;
+        // Reports without an id are given one, 0, by the kernel.
+        featureSizes_[report.id] = static_cast<std::uint16_t>(report.bytes() + 1);
+    }
 }
 
 bool HidrawDevice::isGone() const noexcept {
@@ -182,16 +204,59 @@ vexa_status HidrawDevice::getReport(vexa_report_type type, std::uint32_t reportI
     unsigned long code = HIDIOCGFEATURE(room);
     if (type == VEXA_REPORT_INPUT) code = HIDIOCGINPUT(room);
     if (type == VEXA_REPORT_OUTPUT) code = HIDIOCGOUTPUT(room);
-    report[0] = static_cast<std::uint8_t>(reportId);
+    const auto id = static_cast<std::uint8_t>(reportId);
+    report[0] = id;
+    const auto start = std::chrono::steady_clock::now();
     const int answer = request(control_, code, report.data());
     if (answer < 0) {
         const int error = errno;
         // A kernel that cannot ask for these does not know the number.
         if (error == EINVAL && type != VEXA_REPORT_FEATURE) return VEXA_STATUS_UNSUPPORTED;
-        return statusOf(error);
+        const vexa_status status = statusOf(error);
+        if (type == VEXA_REPORT_FEATURE && status != VEXA_STATUS_GONE) {
+            noteRefused(id, error,
+                        std::chrono::duration_cast<std::chrono::milliseconds>(
+                            std::chrono::steady_clock::now() - start));
+        }
+        return status;
     }
     length = std::min(static_cast<std::size_t>(answer), room);
+    if (type == VEXA_REPORT_FEATURE) noteAnswered(id, length, room);
     return VEXA_STATUS_SUCCESS;
+}
+
+bool HidrawDevice::isNews(std::uint8_t reportId, int outcome) noexcept {
+    return outcomes_[reportId].exchange(outcome) != outcome;
+}
+
+void HidrawDevice::noteRefused(std::uint8_t reportId, int error,
+                               std::chrono::milliseconds took) noexcept {
+    if (!isNews(reportId, error)) return;
+    constexpr std::chrono::milliseconds kLate{1000};
+    constexpr double kMsPerSecond = 1e3;
+    const char* const reason = ::strerrordesc_np(error);
+    // The error of a request that the device let wait does not say that it did.
+    std::array<char, 32> late{};
+    if (took >= kLate) {
+        std::snprintf(late.data(), late.size(), ", after %.1f s",
+                      static_cast<double>(took.count()) / kMsPerSecond);
+    }
+    logLine(LogLevel::Error, "%s: feature report %d is not given: %s%s", node_.c_str(),
+            int{reportId}, reason == nullptr ? "unknown error" : reason, late.data());
+}
+
+void HidrawDevice::noteAnswered(std::uint8_t reportId, std::size_t length,
+                                std::size_t room) noexcept {
+    const std::size_t whole = std::min<std::size_t>(featureSizes_[reportId], room);
+    const bool isShort = length < whole;
+    if (!isNews(reportId, isShort ? -1 - static_cast<int>(length) : 0)) return;
+    if (isShort) {
+        logLine(LogLevel::Error, "%s: feature report %d is too short: %zu of %zu bytes",
+                node_.c_str(), int{reportId}, length, whole);
+    } else {
+        logLine(LogLevel::Info, "%s: feature report %d is given again", node_.c_str(),
+                int{reportId});
+    }
 }
 
 vexa_status HidrawDevice::setFeatureReport(std::span<const std::uint8_t> report) noexcept {

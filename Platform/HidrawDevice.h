@@ -7,6 +7,7 @@
 
 #include <array>
 #include <atomic>
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <span>
@@ -57,6 +58,11 @@ inline constexpr std::array<Entry, 9> kAll = {{
 /// A request for a report blocks its caller until the device or the kernel's limit (5 s on USB)
 /// ends it; reading goes on meanwhile. open() and close() of any hidraw device in the system may
 /// wait for such a request, which is the kernel's way.
+///
+/// A feature report that is refused, not answered in time or shorter than its descriptor says is
+/// logged (HIDService, error), and that it is given again (info), once each time that it changes
+/// and not with each request: whoever asks gets a status or bytes, and the user no reason
+/// otherwise.
 class HidrawDevice : public DeviceBackend {
 public:
     /// Looks at the device once: descriptor, ids, name. `sysPath` is the folder in /sys that the
@@ -96,11 +102,19 @@ public:
 private:
     void readProperties();
     vexa_status statusOf(int error) noexcept;
+    void noteRefused(std::uint8_t reportId, int error, std::chrono::milliseconds took) noexcept;
+    void noteAnswered(std::uint8_t reportId, std::size_t length, std::size_t room) noexcept;
+    bool isNews(std::uint8_t reportId, int outcome) noexcept;
 
     const std::string node_;
     int control_ = -1;
     std::uint64_t number_ = 0;  // of the node, as stat has it
     mutable std::atomic<bool> gone_{false};
+    /// Of feature reports by id, as the descriptor has them: bytes, id included; 0: none.
+    std::array<std::uint16_t, 256> featureSizes_{};
+    /// How each feature report was answered last: 0 as it should be or never asked, an errno, or a
+    /// length that was too short, as -1 - length.
+    std::array<std::atomic<int>, 256> outcomes_{};
     Mutex mutex_;
     PropertyValue::Dictionary properties_ GUARDED_BY(mutex_);
 };

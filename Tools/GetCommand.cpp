@@ -6,6 +6,7 @@
 #include "Tools/DeviceChoice.h"
 #include "Tools/Failure.h"
 #include "Tools/HostedDevice.h"
+#include "Tools/MissingValue.h"
 #include "Tools/OptionValues.h"
 #include "Tools/SettingKeys.h"
 
@@ -128,7 +129,7 @@ Properties readFromOwnDevice(const Arguments& arguments, const std::vector<std::
     const Reader read = [&](const std::string& key) {
         Vexa::PropertyValue value = hosted.session().property(key);
         if (!value) {
-            throw Failure(key + ": there is no such property, or it has no value");
+            throw Failure(missingValueText(key));
         }
         return value;
     };

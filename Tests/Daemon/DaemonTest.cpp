@@ -161,6 +161,33 @@ TEST_F(DaemonTest, AKeyThatNothingKnowsIsRefusedByName) {
         HasSubstr("UnknownKey"));
 }
 
+/// Answers no request for a report.
+class RefusingDevice final : public Tools::ForwardingDevice {
+public:
+    using ForwardingDevice::ForwardingDevice;
+    vexa_status getReport(vexa_report_type, std::uint32_t, std::span<std::uint8_t>,
+                          std::size_t&) noexcept override {
+        return VEXA_STATUS_IO_ERROR;
+    }
+};
+
+TEST_F(DaemonTest, ADeviceThatRefusesAReportIsNotAKeyThatNothingKnows) {
+    start();
+    auto surface = playedSurface("8", example("taps"));
+    surface.open = [open = surface.open] { return std::make_shared<RefusingDevice>(open()); };
+    daemon->source.plug(surface);
+    waitForState(2, "running");
+    const std::string second = BusNames::devicePath(2);
+    for (const char* key : {"FirmwareVersion", "FactoryResetHoldDuration", "CriticalErrors"}) {
+        EXPECT_TRUE(client->get(first, key)) << key;
+        EXPECT_THAT(failureOf([&] { static_cast<void>(client->get(second, key)); }),
+                    AllOf(HasSubstr("(org.vexatouch.Touch1.Error.Failed)"),
+                          HasSubstr(std::string(key) + ": the device gives no value: ")));
+    }
+    EXPECT_THAT(failureOf([&] { static_cast<void>(client->get(second, "Bogus")); }),
+                HasSubstr("(org.vexatouch.Touch1.Error.UnknownKey)"));
+}
+
 TEST_F(DaemonTest, ASettingIsTakenAndReadBack) {
     start();
     EXPECT_EQ(client->set(first, kHoldTimeout, 300), PropertyValue(300U));

@@ -6,6 +6,7 @@
 #include "Platform/TraceListener.h"
 #include "Shared/InputReport.h"
 #include "Tests/Platform/LoopThread.h"
+#include "Tests/Support/LogCapture.h"
 #include "Tests/Support/MockedDevices.h"
 #include "Tests/Tools/CommandRun.h"
 #include "Tools/HidrawSource.h"
@@ -30,6 +31,7 @@ namespace VexaTouch::Testing {
 namespace {
 
 using ::testing::AllOf;
+using ::testing::ElementsAre;
 using ::testing::EndsWith;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
@@ -374,11 +376,24 @@ TEST_F(HidrawCommandsTest, GetAsksTheDevice) {
     EXPECT_EQ(get("PhysicalPath"), (CommandResult{0, "port-1\n", ""}));
     EXPECT_EQ(get("FirmwareVersion").exitCode, 0);
     // Too short and refused: no value, and the service goes on.
-    EXPECT_EQ(get("FactoryResetHoldDuration"),
-              (CommandResult{1, "",
-                             "vexatouch get: FactoryResetHoldDuration: there is no such property, "
-                             "or it has no value\n"}));
-    EXPECT_EQ(get("CriticalErrors").exitCode, 1);
+    LogCapture log;
+    for (const std::string key : {"FactoryResetHoldDuration", "CriticalErrors"}) {
+        EXPECT_EQ(get(key.c_str()),
+                  (CommandResult{1, "",
+                                 "vexatouch get: " + key +
+                                     ": the device gives no value: it refuses, does not answer in "
+                                     "time or answers with too few bytes; the log says which\n"}));
+    }
+    std::vector<LogLine> errors = log.take();
+    std::erase_if(errors, [](const LogLine& line) { return line.level != Vexa::LogLevel::Error; });
+    EXPECT_THAT(
+        errors,
+        ElementsAre(error("/dev/hidraw0: feature report 31 is too short: 2 of 5 bytes"),
+                    error("/dev/hidraw0: feature report 63 is not given: Input/output error")));
+    EXPECT_EQ(
+        get("Colour"),
+        (CommandResult{1, "",
+                       "vexatouch get: Colour: there is no such property, or it has no value\n"}));
 }
 
 TEST_F(HidrawCommandsTest, SetIsReadBack) {

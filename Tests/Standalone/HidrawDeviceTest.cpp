@@ -4,6 +4,7 @@
 
 #include "Platform/HidDevice.h"
 #include "Tests/Platform/LoopThread.h"
+#include "Tests/Support/LogCapture.h"
 #include "Tests/Support/MockedDevices.h"
 #include "Tests/Support/PrintPropertyValue.h"
 
@@ -272,6 +273,42 @@ TEST_F(HidrawDeviceTest, SaysWhyAFeatureReportFailed) {
     std::size_t length = 8;
     EXPECT_EQ(device.getReport(VEXA_REPORT_INPUT, 1, buffer, length), VEXA_STATUS_UNSUPPORTED);
     EXPECT_EQ(length, 0U);
+}
+
+TEST_F(HidrawDeviceTest, AFeatureReportThatFailsIsLoggedWhenThatChangesAndNotEachTime) {
+    devices_.plug(0);
+    HidrawDevice device("/dev/hidraw0");
+    LogCapture log;
+    const auto askTwice = [&](std::uint8_t id, const MockedAnswer& answer, std::size_t room = 64) {
+        devices_.setFeature(0, id, answer);
+        featureOf(device, id, room);
+        featureOf(device, id, room);
+        return log.take();
+    };
+    EXPECT_THAT(askTwice(4, {.bytes = {4, 1, 2}}), ElementsAre());
+    EXPECT_THAT(
+        askTwice(4, {.bytes = {}, .error = EIO}),
+        ElementsAre(error("/dev/hidraw0: feature report 4 is not given: Input/output error")));
+    EXPECT_THAT(
+        askTwice(4, {.bytes = {}, .error = ETIMEDOUT}),
+        ElementsAre(error("/dev/hidraw0: feature report 4 is not given: Connection timed out")));
+    EXPECT_THAT(askTwice(4, {.bytes = {4, 1}}),
+                ElementsAre(error("/dev/hidraw0: feature report 4 is too short: 2 of 3 bytes")));
+    EXPECT_THAT(askTwice(4, {.bytes = {}}),
+                ElementsAre(error("/dev/hidraw0: feature report 4 is too short: 0 of 3 bytes")));
+    // Another report has its own.
+    EXPECT_THAT(
+        askTwice(63, {.bytes = {}, .error = EIO}),
+        ElementsAre(error("/dev/hidraw0: feature report 63 is not given: Input/output error")));
+    EXPECT_THAT(askTwice(4, {.bytes = {4, 1, 2}}),
+                ElementsAre(info("/dev/hidraw0: feature report 4 is given again")));
+    // It is whole for who has room for two bytes; of one that nothing declares nothing is missing.
+    EXPECT_THAT(askTwice(4, {.bytes = {4, 1, 2}}, 2), ElementsAre());
+    EXPECT_THAT(askTwice(7, {.bytes = {7}}), ElementsAre());
+
+    devices_.unplug(0);
+    featureOf(device, 4);
+    EXPECT_THAT(log.take(), ElementsAre());
 }
 
 TEST_F(HidrawDeviceTest, ARequestThatEndsWithTheUnplugSaysGone) {

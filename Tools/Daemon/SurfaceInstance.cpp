@@ -4,6 +4,7 @@
 #include "Shared/Util.h"
 #include "Tools/Daemon/PropertyRules.h"
 #include "Tools/Failure.h"
+#include "Tools/MissingValue.h"
 #include "Tools/ObservedDevice.h"
 #include "Tools/SettingKeys.h"
 
@@ -373,8 +374,8 @@ void SurfaceInstance::get(const Caller& caller, const std::string& key,
         [key](Parts& parts) {
             Vexa::PropertyValue value = parts.session->property(key);
             if (!value) {
-                throw BusError(ErrorName::kUnknownKey,
-                               key + ": there is no such property, or it has no value");
+                throw BusError(isReadFromDevice(key) ? ErrorName::kFailed : ErrorName::kUnknownKey,
+                               missingValueText(key));
             }
             return value;
         },
