@@ -17,10 +17,10 @@ bool FrameGaps::see(std::span<const std::uint8_t> report) noexcept {
         return false;
     }
     const std::uint32_t missing = image->frameNumber - *before - 1U;
-    gaps_.fetch_add(1);
     if (missing <= kMostLost) {
         framesLost_.fetch_add(missing);
     }
+    gaps_.fetch_add(1);
     return true;
 }
 

@@ -21,10 +21,8 @@ public:
     /// The next report of the device; what is no image is passed over. Whether there is a gap
     /// before it. One thread at a time; never blocks or allocates.
     bool see(std::span<const std::uint8_t> report) noexcept;
-    /// The next image is the first, as in a new opening.
-    void beginAnew() noexcept { last_.reset(); }
 
-    // Any thread.
+    // Any thread. Ask for the gaps first: what was lost in them is counted by then.
     [[nodiscard]] std::uint64_t gaps() const noexcept { return gaps_.load(); }
     [[nodiscard]] std::uint64_t framesLost() const noexcept { return framesLost_.load(); }
 

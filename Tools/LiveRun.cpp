@@ -281,9 +281,10 @@ void LiveRun::tellOfGaps() {
 }
 
 std::string LiveRun::gapsText() const {
+    // A report is seen here before the service gets it, so the service may not have counted yet.
     const Vexa::PropertyValue found = session_.property("DisjointImageCount");
-    return counted(found.asUnsigned().value_or(gaps_.gaps()), "gap") + ", " +
-           counted(gaps_.framesLost(), "frame") + " lost";
+    const std::uint64_t gaps = std::max(gaps_.gaps(), found.asUnsigned().value_or(0));
+    return counted(gaps, "gap") + ", " + counted(gaps_.framesLost(), "frame") + " lost";
 }
 
 void LiveRun::takeEvents() {

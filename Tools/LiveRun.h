@@ -111,8 +111,8 @@ private:
     void tellOfGaps();
     void writeRecordingOnWish();
     void writeRecording();
-    /// Gaps that the service has found in the frame numbers, and what was lost in them: "2 gaps, 14
-    /// frames lost".
+    /// Gaps in the frame numbers, as found here or by the service, whoever has come further, and
+    /// what was lost in them: "2 gaps, 14 frames lost".
     [[nodiscard]] std::string gapsText() const;
     void printSummary(const std::string& gaps) const;
 

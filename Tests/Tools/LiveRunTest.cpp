@@ -9,6 +9,7 @@
 #include "Tests/Tools/CommandRun.h"
 #include "Tools/EventRecord.h"
 #include "Tools/Failure.h"
+#include "Tools/FrameGaps.h"
 #include "Tools/PlayedDevice.h"
 #include "Tools/RecordedDevice.h"
 #include "Tools/RecordingFile.h"
@@ -31,6 +32,7 @@
 #include <limits>
 #include <memory>
 #include <set>
+#include <span>
 #include <sstream>
 #include <streambuf>
 #include <string>
@@ -364,6 +366,79 @@ TEST_F(LiveRunTest, KeyIsReleasedBeforeTheDeviceIsWaitedFor) {
         }
         EXPECT_TRUE(device->wasReleased()) << unplugs;
     }
+}
+
+/// Messages, and word of the first line that tells of gaps.
+class MessagesToldOf final : public std::streambuf {
+public:
+    explicit MessagesToldOf(std::promise<void>& told) : told_(told) {}
+    [[nodiscard]] const std::string& text() const { return text_; }
+
+protected:
+    int_type overflow(int_type character) override {
+        const char byte = traits_type::to_char_type(character);
+        xsputn(&byte, 1);
+        return character;
+    }
+    std::streamsize xsputn(const char* text, std::streamsize length) override {
+        text_.append(text, static_cast<std::size_t>(length));
+        return length;
+    }
+    int sync() override {
+        if (text_.find(": so far ") != std::string::npos && !std::exchange(isTold_, true)) {
+            told_.set_value();
+        }
+        return 0;
+    }
+
+private:
+    std::promise<void>& told_;
+    bool isTold_ = false;
+    std::string text_;
+};
+
+/// A device whose service gets the first image after a gap when `told`, or after so long that a
+/// test has failed.
+class SlowAfterAGap final : public PlayedDevice {
+public:
+    SlowAfterAGap(FrameSource plays, std::future<void> told)
+        : PlayedDevice(std::move(plays), Tools::PlayedPace{.speed = kAsFastAsTaken},
+                       Tools::SurfaceIdentity{}, Vexa::HostClock::system()),
+          told_(std::move(told)) {}
+
+    void reportArrived(std::span<const std::uint8_t> report,
+                       std::uint64_t timestamp) noexcept override {
+        PlayedDevice::reportArrived(report, timestamp);
+        if (gaps_.see(report) && gaps_.gaps() == 1) {
+            told_.wait_for(std::chrono::minutes(1));
+        }
+    }
+
+private:
+    std::future<void> told_;
+    Tools::FrameGaps gaps_;
+};
+
+TEST_F(LiveRunTest, AGapThatTheServiceHasNotCountedYetIsToldOf) {
+    std::promise<void> told;
+    MessagesToldOf messages(told);
+    std::ostream errors(&messages);
+    Tools::Streams toldOf{.in = in, .out = out, .error = errors};
+    const auto frames = framesOf("disjoint-frames");
+    const auto device = std::make_shared<SlowAfterAGap>(
+        [&](const PlayedDevice::FrameSink& sink) {
+            for (const auto& frame : frames) {
+                sink(frame);
+            }
+        },
+        told.get_future());
+    const Tools::WakeUp wake;
+    Tools::SignalWatch signals(wake);
+    const Host::PluginLibrary library = Host::PluginLibrary::loadDefault();
+    Tools::LiveRun live(library, device, {.json = true}, signals, wake, toldOf);
+    live.run();
+    EXPECT_THAT(messages.text(),
+                ::testing::StartsWith("vexatouch run: so far 1 gap, 3 frames lost\n"));
 }
 
 TEST_F(LiveRunTest, EventsBeyondTheRoomAreCountedAndTheRunFails) {
