@@ -224,39 +224,46 @@ TEST(SerialQueue, IsNotMadeWithoutDescriptorsLeft) {
     vexa_queue_release(queue);
 }
 
-// Others push while a task lets go of the queue: what they pushed runs before it ends.
+// Others push, and let go, while a task that is running lets go: what they pushed runs before the
+// queue ends, whoever is the last.
 TEST(SerialQueue, RunsWhatCameWhileItsLastTaskLetGo) {
+    constexpr int kPushers = 3;
+    struct Context {
+        vexa_queue* queue;
+        bool isLast;                       // the task, in any case
+        std::latch running{kPushers + 1};  // the task, and those who push
+        std::latch released{kPushers};
+        std::atomic<int> ran{0};
+    };
     for (int round = 0; round < 200; ++round) {
         const std::int64_t before = liveQueues();
-        vexa_queue* const queue = vexa_queue_create("last");
-        ASSERT_NE(queue, nullptr);
-        std::latch submitted(1);
-        std::atomic<int> ran{0};
-        struct Context {
-            vexa_queue* queue;
-            std::latch* submitted;
-            std::atomic<int>* ran;
-        } context{queue, &submitted, &ran};
-        vexa_queue_retain(queue);
+        Context context{.queue = vexa_queue_create("last"), .isLast = round % 2 == 0};
+        ASSERT_NE(context.queue, nullptr);
+        // The first reference is the task's.
+        for (int i = 0; i < kPushers; ++i) vexa_queue_retain(context.queue);
         ASSERT_TRUE(vexa_queue_submit(
-            queue,
+            context.queue,
             [](void* pointer) {
-                const Context& of = *static_cast<Context*>(pointer);
-                of.submitted->wait();
+                Context& of = *static_cast<Context*>(pointer);
+                of.running.arrive_and_wait();
+                if (of.isLast) of.released.wait();
                 vexa_queue_release(of.queue);
             },
             &context));
-        for (int i = 0; i < 3; ++i) {
-            ASSERT_TRUE(vexa_queue_submit(
-                queue, [](void* pointer) { ++*static_cast<Context*>(pointer)->ran; }, &context));
+        std::vector<std::thread> pushers;
+        for (int i = 0; i < kPushers; ++i) {
+            pushers.emplace_back([&context] {
+                context.running.arrive_and_wait();
+                EXPECT_TRUE(vexa_queue_submit(
+                    context.queue, [](void* pointer) { ++static_cast<Context*>(pointer)->ran; },
+                    &context));
+                vexa_queue_release(context.queue);
+                context.released.count_down();
+            });
         }
-        // Either of the two may be the last.
-        std::thread([&] {
-            submitted.count_down();
-            vexa_queue_release(queue);
-        }).join();
+        for (std::thread& pusher : pushers) pusher.join();
         waitForLiveQueues(before);
-        EXPECT_EQ(ran, 3);
+        EXPECT_EQ(context.ran, kPushers) << round;
     }
 }
 
