@@ -49,16 +49,33 @@ TEST(SurfaceMatchTest, SaysEverythingThatIsMissing) {
         // Fourteen signed pixels.
         {ours({0x95, 0x0F, 0x09, 0x13}, {0x95, 0x0E, 0x09, 0x13}),
          "input report 1 has 68 bytes after its id, not 72"},
+        // Three reserved bytes.
+        {ours({0x95, 0x04, 0x09, 0x12}, {0x95, 0x03, 0x09, 0x12}),
+         "input report 1 has 71 bytes after its id, not 72"},
         {ours({0x75, 0x08, 0x95, 0x09}, {0x75, 0x08, 0x95, 0x08}),
          "input report 2 has 8 bytes after its id, not 9"},
         {ours({0x95, 0x02, 0x09, 0x30}, {0x95, 0x01, 0x09, 0x30}),
          "feature report 4 has 1 byte after its id, not 2"},
+        // 24 bits for this report alone.
+        {ours({0x09, 0x31, 0xB1, 0x02}, {0x75, 0x18, 0x09, 0x31, 0xB1, 0x02, 0x75, 0x20}),
+         "feature report 31 has 3 bytes after its id, not 4"},
+        {ours({0x09, 0x32, 0xB1, 0x02}, {0x75, 0x18, 0x09, 0x32, 0xB1, 0x02}),
+         "feature report 63 has 3 bytes after its id, not 4"},
         {ours({0x09, 0x31, 0xB1, 0x02}, {0x09, 0x31, 0x81, 0x02}), "no feature report 31"},
         {ours({0x85, 0x3F}, {0x85, 0x3E}), "no feature report 63"},
     };
     for (const auto& [descriptor, reason] : cases) {
         EXPECT_EQ(SurfaceMatch().reason(deviceWith(descriptor)), reason);
         EXPECT_FALSE(SurfaceMatch().matches(deviceWith(descriptor))) << reason;
+    }
+}
+
+TEST(SurfaceMatchTest, OurOwnReportsAreAsShortAsReportsMayBe) {
+    const auto descriptor = Vexa::parseReportDescriptor(kOurs);
+    ASSERT_TRUE(descriptor);
+    for (const SurfaceMatch::Report& wanted : SurfaceMatch::kReports) {
+        EXPECT_EQ(descriptor->find(wanted.kind, wanted.id)->bytes(), wanted.bytes)
+            << unsigned{wanted.id};
     }
 }
 
