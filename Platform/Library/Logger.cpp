@@ -162,11 +162,21 @@ void Logger::deliver(const LogMessage& message) noexcept {
     isInSink = false;
 }
 
-void Logger::writeByDefault(const LogMessage& message) const noexcept {
+void Logger::writeByDefault(const LogMessage& message) noexcept {
     try {
-        if (!journal_.isStandardError() || !journal_.send(message)) StandardError::write(message);
+        if (journal_.isStandardError() && journal_.send(message)) return;
+        limit_.pass(message, std::chrono::steady_clock::now(), &StandardError::write);
     } catch (...) {
         return;  // no memory: the message is lost
+    }
+}
+
+void Logger::tellLeftOut() noexcept {
+    try {
+        const MutexLock lock(mutex_);
+        limit_.tellAll(std::chrono::steady_clock::now(), &StandardError::write);
+    } catch (...) {
+        return;  // no memory: likewise
     }
 }
 
@@ -203,6 +213,7 @@ void Logger::writeAsTheyCome() noexcept {
         const bool isEnding = isEnding_.load();
         flush();
         if (isEnding) {
+            tellLeftOut();
             sem_post(&ended_);
             return;
         }

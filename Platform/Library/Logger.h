@@ -1,6 +1,7 @@
 #pragma once
 
 #include "Platform/Library/Journal.h"
+#include "Platform/Library/LogLimit.h"
 #include "Platform/Library/LogMessage.h"
 #include "Platform/Library/LogRing.h"
 #include "Platform/Mutex.h"
@@ -62,13 +63,15 @@ private:
     void drain() noexcept REQUIRES(mutex_);
     void reportDropped(std::uint64_t total) noexcept REQUIRES(mutex_);
     void deliver(const LogMessage& message) noexcept REQUIRES(mutex_);
-    void writeByDefault(const LogMessage& message) const noexcept REQUIRES(mutex_);
+    void writeByDefault(const LogMessage& message) noexcept REQUIRES(mutex_);
+    void tellLeftOut() noexcept;
 
     Mutex mutex_;  // also for the front of the ring
     Sink sink_ GUARDED_BY(mutex_);
     bool isReplacedInCall_ GUARDED_BY(mutex_) = false;
     // Kept, so that telling of dropped messages needs no memory.
     LogMessage report_ GUARDED_BY(mutex_);
+    LogLimit limit_ GUARDED_BY(mutex_);  // of standard error; the journal has its own
     const Journal journal_;
 
     std::atomic<LogRing*> ring_{nullptr};  // made with the first writer, kept to the end

@@ -199,7 +199,7 @@ TEST_F(LogProcessTest, TheJournalGetsMessagesWithTheirFields) {
 TEST_F(LogProcessTest, TheJournalNamesTheThreadThatLogged) {
     giveJournalStream();
     giveJournalLibrary();
-    EXPECT_EQ(run({"unblocked", "2"}), 0);
+    EXPECT_EQ(run({"unblocked", "error", "2"}), 0);
     std::smatch match;
     const std::string fields = contentOf(journal);
     // Both from one thread, though another one sent them.
@@ -237,19 +237,40 @@ TEST_F(LogProcessTest, AnotherFileThanTheJournalsStreamIsStandardError) {
 }
 
 TEST_F(LogProcessTest, WhatWaitsForTheSinkIsWrittenAtTheEnd) {
-    EXPECT_EQ(run({"unblocked", "1000"}), 0);
+    environment["VEXATOUCH_LOG"] = "info";
+    EXPECT_EQ(run({"unblocked", "info", "1000"}), 0);
     std::string expected;
     for (int i = 0; i < 1000; ++i) {
-        expected += "HIDService error: message " + std::to_string(i) + "\n";
+        expected += "HIDService info: message " + std::to_string(i) + "\n";
     }
     EXPECT_EQ(std::regex_replace(contentOf(error), std::regex(kTime), ""), expected);
+}
+
+TEST_F(LogProcessTest, ErrorsThatDifferInNumbersDoNotFillStandardError) {
+    EXPECT_EQ(run({"unblocked", "error", "1000"}), 0);
+    std::string expected;
+    for (int i = 0; i < 20; ++i) {
+        expected += "HIDService error: message " + std::to_string(i) + "\n";
+    }
+    expected += "HIDService error: 980 more like this left out, the last: message 999\n";
+    EXPECT_EQ(std::regex_replace(contentOf(error), std::regex(kTime), ""), expected);
+}
+
+TEST_F(LogProcessTest, TheJournalGetsEveryError) {
+    giveJournalStream();
+    giveJournalLibrary();
+    EXPECT_EQ(run({"unblocked", "error", "50"}), 0);
+    const std::string fields = contentOf(journal);
+    EXPECT_THAT(fields, testing::HasSubstr("MESSAGE=message 49\n"));
+    EXPECT_EQ(contentOf(error), "");
 }
 
 TEST_F(LogProcessTest, AFullPipeDoesNotHoldTheEndUp) {
     int ends[2] = {-1, -1};
     ASSERT_EQ(pipe(ends), 0);
     // More than the pipe and the ring hold. Nobody reads.
-    EXPECT_EQ(run({"unblocked", "10000"}, ends[1]), 0);
+    environment["VEXATOUCH_LOG"] = "info";
+    EXPECT_EQ(run({"unblocked", "info", "10000"}, ends[1]), 0);
     close(ends[0]);
     close(ends[1]);
 }
@@ -279,7 +300,7 @@ TEST_F(LogProcessTest, AClosedPipeLosesMessagesOnly) {
     int ends[2] = {-1, -1};
     ASSERT_EQ(pipe(ends), 0);
     close(ends[0]);
-    EXPECT_EQ(run({"unblocked", "10"}, ends[1]), 0);
+    EXPECT_EQ(run({"unblocked", "error", "10"}, ends[1]), 0);
     close(ends[1]);
 }
 

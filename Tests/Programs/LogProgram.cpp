@@ -30,11 +30,11 @@ void printLevels() {
 }
 
 /// Logs numbered messages on a thread that must not block, and leaves at once.
-void logWithoutBlocking(int count) {
-    std::thread([count] {
+void logWithoutBlocking(int count, LogLevel level = LogLevel::Error) {
+    std::thread([count, level] {
         const Vexa::LogWithoutBlocking here;
         for (int i = 0; i < count; ++i) {
-            Log(LogCategory::HIDService).write(LogLevel::Error, "message " + std::to_string(i));
+            Log(LogCategory::HIDService).write(level, "message " + std::to_string(i));
         }
     }).join();
 }
@@ -71,8 +71,8 @@ void printScheduling() {
 
 int usage() {
     std::fputs(
-        "usage: LogProgram levels | write CATEGORY LEVEL TEXT | unblocked COUNT | forked | "
-        "scheduling\n",
+        "usage: LogProgram levels | write CATEGORY LEVEL TEXT | unblocked LEVEL COUNT | "
+        "forked | scheduling\n",
         stderr);
     return EXIT_FAILURE;
 }
@@ -88,8 +88,10 @@ int main(int count, char** values) {
         const auto level = Vexa::logLevelFromName(arguments[2]);
         if (!category || !level) return usage();
         Log(*category).write(*level, arguments[3]);
-    } else if (arguments.size() == 2 && arguments[0] == "unblocked") {
-        logWithoutBlocking(std::atoi(values[2]));
+    } else if (arguments.size() == 3 && arguments[0] == "unblocked") {
+        const auto level = Vexa::logLevelFromName(arguments[1]);
+        if (!level) return usage();
+        logWithoutBlocking(std::atoi(values[3]), *level);
     } else if (arguments.size() == 1 && arguments[0] == "forked") {
         return logInForkedProcess();
     } else if (arguments.size() == 1 && arguments[0] == "scheduling") {

@@ -2,7 +2,9 @@
  *
  * Levels and sink belong to the process. Messages below a category's level cost one load. They go
  * to standard error, a line each with its time; when standard error is the journal's stream (a
- * service run by systemd) they go to the journal with their fields instead.
+ * service run by systemd) they go to the journal with their fields instead. On standard error, of
+ * errors that differ in their digits alone 20 a minute are written; a line tells how many more were
+ * left out. The journal has a limit of its own, and a sink gets everything.
  *
  * The environment variable VEXATOUCH_LOG sets the levels when the library is loaded: a level for
  * all categories ("debug") or a list ("HIDService=debug,Algs=info"). What it does not know it says
