@@ -1,5 +1,6 @@
 #include "Tools/AppendTarget.h"
 
+#include "Tools/DiskSync.h"
 #include "Tools/Failure.h"
 
 #include <fcntl.h>
@@ -51,101 +52,110 @@ public:
         return ::ftruncate(descriptor_.get(), static_cast<off_t>(offset)) == 0 ? 0 : errno;
     }
 
-    int sync() noexcept override {
-        if (::fdatasync(descriptor_.get()) == 0 || errno == EINVAL || errno == EROFS) {
-            return 0;  // or there is nothing that could be done
-        }
-        return errno;
-    }
+    int sync() noexcept override { return syncFile(descriptor_.get()); }
 
     int close() noexcept override { return ::close(descriptor_.release()) == 0 ? 0 : errno; }
 
 protected:
-    /// Whether the open file is the one of that name. Another program may have given the name to a
-    /// file of its own meanwhile.
-    [[nodiscard]] bool isNamed(const std::string& path) const noexcept {
-        struct stat own{};
-        struct stat named{};
-        return ::fstat(descriptor_.get(), &own) == 0 && ::lstat(path.c_str(), &named) == 0 &&
-               own.st_dev == named.st_dev && own.st_ino == named.st_ino;
-    }
+    [[nodiscard]] int descriptor() const noexcept { return descriptor_.get(); }
 
 private:
     FileDescriptor descriptor_;
     bool isRegular_;
 };
 
-/// A regular file that was made or was empty.
-class NewFile final : public DescriptorTarget {
+/// The path by which the system knows an open file that has no name.
+std::string openPath(int descriptor) {
+    return "/proc/self/fd/" + std::to_string(descriptor);
+}
+
+/// A regular file with a name, which was made, was empty, or takes that of an old one when it is
+/// kept.
+class FileTarget final : public DescriptorTarget {
 public:
-    NewFile(FileDescriptor descriptor, std::string path, bool wasMade) noexcept
+    enum class Origin : std::uint8_t { Made, Empty, Beside };
+
+    /// `beside` is the name of the new file beside the old one. Where it `isNameless`, it gets that
+    /// only when it is kept.
+    FileTarget(Origin origin, FileDescriptor descriptor, const std::filesystem::path& path,
+               std::string beside = {}, bool isNameless = false)
         : DescriptorTarget(std::move(descriptor), true),
-          path_(std::move(path)),
-          wasMade_(wasMade) {}
-    ~NewFile() override {
+          origin_(origin),
+          path_(path),
+          folder_(path.parent_path()),
+          beside_(std::move(beside)),
+          openPath_(isNameless ? openPath(this->descriptor()) : std::string()) {}
+    ~FileTarget() override {
+        const std::string& name = origin_ == Origin::Beside ? beside_ : path_;
         if (isKept_) {
             return;
         }
-        if (!wasMade_) {
+        if (origin_ == Origin::Empty) {
             DescriptorTarget::cut(0);
-        } else if (isNamed(path_)) {
-            ::unlink(path_.c_str());
+        } else if (isNamed(name)) {
+            ::unlink(name.c_str());
         }
     }
-    NewFile(const NewFile&) = delete;
-    NewFile(NewFile&&) = delete;
-    NewFile& operator=(const NewFile&) = delete;
-    NewFile& operator=(NewFile&&) = delete;
+    FileTarget(const FileTarget&) = delete;
+    FileTarget(FileTarget&&) = delete;
+    FileTarget& operator=(const FileTarget&) = delete;
+    FileTarget& operator=(FileTarget&&) = delete;
 
     int keep() noexcept override {
+        if (origin_ == Origin::Beside && !isKept_) {
+            return replace();
+        }
         isKept_ = true;
         return 0;
     }
+    [[nodiscard]] bool wasThere() const noexcept override { return origin_ != Origin::Made; }
+    [[nodiscard]] std::string beside() const override {
+        return isBeside_ ? beside_ : std::string();
+    }
+    int sync() noexcept override {
+        int error = DescriptorTarget::sync();
+        if (error == 0 && isKept_ && !isNameSafe_) {
+            error = syncFolder(folder_);
+            isNameSafe_ = error == 0;
+        }
+        return error;
+    }
 
 private:
-    const std::string path_;
-    const bool wasMade_;
-    bool isKept_ = false;
-};
-
-/// A new file beside the old one, whose name it takes when it is kept.
-class ReplacingFile final : public DescriptorTarget {
-public:
-    ReplacingFile(FileDescriptor descriptor, std::string temporary, std::string path) noexcept
-        : DescriptorTarget(std::move(descriptor), true),
-          temporary_(std::move(temporary)),
-          path_(std::move(path)) {}
-    ~ReplacingFile() override {
-        if (!isKept_) {
-            ::unlink(temporary_.c_str());
+    int replace() noexcept {
+        // Otherwise the machine's end might leave the name with nothing behind it.
+        if (const int error = DescriptorTarget::sync(); error != 0) {
+            return error;
         }
-    }
-    ReplacingFile(const ReplacingFile&) = delete;
-    ReplacingFile(ReplacingFile&&) = delete;
-    ReplacingFile& operator=(const ReplacingFile&) = delete;
-    ReplacingFile& operator=(ReplacingFile&&) = delete;
-
-    int keep() noexcept override {
-        if (isKept_) {
-            return 0;
+        if (!openPath_.empty() && ::linkat(AT_FDCWD, openPath_.c_str(), AT_FDCWD, beside_.c_str(),
+                                           AT_SYMLINK_FOLLOW) != 0) {
+            return errno;
         }
         // What was written is there, under either name.
         isKept_ = true;
-        if (::rename(temporary_.c_str(), path_.c_str()) != 0) {
+        if (::rename(beside_.c_str(), path_.c_str()) != 0) {
             isBeside_ = true;
             return errno;
         }
         return 0;
     }
-    [[nodiscard]] std::string beside() const override {
-        return isBeside_ ? temporary_ : std::string();
+    /// Whether the open file is the one of that name. Another program may have given the name to a
+    /// file of its own meanwhile.
+    [[nodiscard]] bool isNamed(const std::string& path) const noexcept {
+        struct stat own{};
+        struct stat named{};
+        return ::fstat(descriptor(), &own) == 0 && ::lstat(path.c_str(), &named) == 0 &&
+               own.st_dev == named.st_dev && own.st_ino == named.st_ino;
     }
 
-private:
-    const std::string temporary_;
+    const Origin origin_;
     const std::string path_;
+    const std::string folder_;
+    const std::string beside_;
+    const std::string openPath_;  // of a file without a name
     bool isKept_ = false;
     bool isBeside_ = false;  // its name could not be taken
+    bool isNameSafe_ = false;
 };
 
 /// The result stream. Each write is there for its reader when it returns.
@@ -171,10 +181,20 @@ private:
     std::ostream& stream_;
 };
 
-/// A new file beside the old one, under a name of its own.
-FileDescriptor makeBeside(const std::filesystem::path& target, std::string& name) {
+/// A new file for the folder of the old one, and a name for it that is free. It has that already
+/// unless `isNameless`, which not every file system knows.
+FileDescriptor makeBeside(const std::filesystem::path& target, std::string& name,
+                          bool& isNameless) {
     name = target.parent_path() / ("." + target.filename().string() + ".XXXXXX");
-    return FileDescriptor(::mkostemp(name.data(), O_CLOEXEC));
+    FileDescriptor nameless(
+        ::open(target.parent_path().c_str(), O_WRONLY | O_TMPFILE | O_CLOEXEC, S_IRUSR | S_IWUSR));
+    isNameless = nameless && ::access(openPath(nameless.get()).c_str(), F_OK) == 0;
+    FileDescriptor named(::mkostemp(name.data(), O_CLOEXEC));
+    if (named && isNameless) {
+        ::unlink(name.c_str());
+        return nameless;
+    }
+    return named;
 }
 
 std::unique_ptr<AppendTarget> replaceFile(const std::string& path, const struct stat& old) {
@@ -188,13 +208,15 @@ std::unique_ptr<AppendTarget> replaceFile(const std::string& path, const struct 
         fail(path, errno);
     }
     std::string name;
-    FileDescriptor descriptor = makeBeside(target, name);
+    bool isNameless = false;
+    FileDescriptor descriptor = makeBeside(target, name, isNameless);
     if (!descriptor) {
         fail(path, errno);
     }
     // Best effort: the file stays as readable as it was.
     static_cast<void>(::fchmod(descriptor.get(), old.st_mode & 07777U) == 0);
-    return std::make_unique<ReplacingFile>(std::move(descriptor), std::move(name), target);
+    return std::make_unique<FileTarget>(FileTarget::Origin::Beside, std::move(descriptor), target,
+                                        std::move(name), isNameless);
 }
 
 }  // namespace
@@ -207,7 +229,7 @@ std::unique_ptr<AppendTarget> openAppendTarget(const std::string& path, bool rep
     FileDescriptor made(
         ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kNewFileMode));
     if (made) {
-        return std::make_unique<NewFile>(std::move(made), path, true);
+        return std::make_unique<FileTarget>(FileTarget::Origin::Made, std::move(made), path);
     }
     const int reason = errno;
     struct stat old{};
@@ -227,7 +249,7 @@ std::unique_ptr<AppendTarget> openAppendTarget(const std::string& path, bool rep
         fail(path, errno);
     }
     if (S_ISREG(old.st_mode)) {
-        return std::make_unique<NewFile>(std::move(opened), path, false);
+        return std::make_unique<FileTarget>(FileTarget::Origin::Empty, std::move(opened), path);
     }
     return std::make_unique<DescriptorTarget>(std::move(opened), false);
 }

@@ -38,9 +38,12 @@ public:
     /// To be called once what was written is worth a file: until then a target that is destroyed
     /// leaves everything as it was before it was opened.
     virtual int keep() noexcept { return 0; }
+    /// Whether there is something that such an end leaves as it was.
+    [[nodiscard]] virtual bool wasThere() const noexcept { return false; }
     /// The file in which what was written stays although keep() failed; empty where there is none.
     [[nodiscard]] virtual std::string beside() const { return {}; }
-    /// Returns when what was written would survive the machine's end.
+    /// Returns when what was written would survive the machine's end, once it is kept with its
+    /// name.
     virtual int sync() noexcept = 0;
     virtual int close() noexcept = 0;
 };
@@ -49,9 +52,11 @@ public:
 ///
 /// A regular file appears at once, empty. One that is there already and not empty is refused,
 /// unless `replace`: then a new file takes its name when it is kept, and who has the old one open
-/// keeps that. Where it cannot (the old one is a mount point, or another user's in a folder that
-/// protects it), both files stay. What is no regular file (a pipe, a device) is written as it is.
-/// Throws Failure with the name and why.
+/// keeps that. Until then the new one has no name, and goes with the program however that ends;
+/// only where the file system knows no such files it is ".FILE.XXXXXX" from the beginning. Where it
+/// cannot (the old one is a mount point, or another user's in a folder that protects it), both
+/// files stay. What is no regular file (a pipe, a device) is written as it is. Throws Failure with
+/// the name and why.
 std::unique_ptr<AppendTarget> openAppendTarget(const std::string& path, bool replace,
                                                Streams& streams);
 

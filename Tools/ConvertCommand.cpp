@@ -243,7 +243,7 @@ void writeAs(Format format, FrameList frames, const std::string& path, Streams& 
         writeRecording(frames, path, streams);
         return;
     }
-    OutputFile file(path, streams);
+    OutputFile file(path, streams, OutputFile::Content::Derivable);
     if (format == Format::HidRecorder) {
         writeFrames<HidRecorderWriter>(frames, file, streams);
     } else if (format == Format::Csv) {

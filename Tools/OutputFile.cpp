@@ -1,5 +1,6 @@
 #include "Tools/OutputFile.h"
 
+#include "Tools/DiskSync.h"
 #include "Tools/Failure.h"
 
 #include <fcntl.h>
@@ -8,9 +9,10 @@
 
 #include <array>
 #include <cerrno>
-#include <cstring>
+#include <cstdio>
 #include <random>
 #include <system_error>
+#include <utility>
 
 namespace VexaTouch::Tools {
 namespace {
@@ -31,7 +33,7 @@ std::filesystem::path temporaryName(const std::filesystem::path& target) {
 
 }  // namespace
 
-OutputFile::OutputFile(const std::string& path, Streams& streams)
+OutputFile::OutputFile(const std::string& path, Streams& streams, Content content)
     : name_(path == "-" ? "standard output" : path) {
     if (path == "-") {
         stream_ = &streams.out;
@@ -43,6 +45,7 @@ OutputFile::OutputFile(const std::string& path, Streams& streams)
     target_ = error ? std::filesystem::path(path) : resolved;
     struct stat status{};
     const bool exists = stat(target_.c_str(), &status) == 0;
+    waitsForDisk_ = exists || content == Content::Unique;
     if (exists && S_ISDIR(status.st_mode)) {
         fail(EISDIR);
     }
@@ -131,19 +134,34 @@ void OutputFile::commit() {
     }
     writeThrough(buffer_);
     buffer_.clear();
-    const int descriptor = descriptor_;
-    descriptor_ = -1;
-    if (close(descriptor) != 0) {
-        fail(errno);
-    }
-    if (!temporary_.empty()) {
-        std::error_code error;
-        std::filesystem::rename(temporary_, target_, error);
-        if (error) {
-            fail(error.value());
+    if (temporary_.empty()) {
+        if (const int error = closeDescriptor(); error != 0) {
+            fail(error);
         }
-        temporary_.clear();
+        return;
     }
+    // From here on it is whole, and not removed any more.
+    const std::string written = std::exchange(temporary_, {});
+    // Otherwise the machine's end might leave the name with nothing behind it.
+    const int unsafe = waitsForDisk_ ? syncFile(descriptor_) : 0;
+    const int unclosed = closeDescriptor();
+    if (const int error = unsafe != 0 ? unsafe : unclosed; error != 0) {
+        throw Failure(name_ + ": the disk did not confirm what was written: " +
+                      std::generic_category().message(error) + "; it is in " + written);
+    }
+    if (::rename(written.c_str(), target_.c_str()) != 0) {
+        throw Failure(name_ + ": the new file cannot take its place: " +
+                      std::generic_category().message(errno) + "; what was written is in " +
+                      written);
+    }
+    if (const int error = waitsForDisk_ ? syncFolder(target_.parent_path()) : 0; error != 0) {
+        throw Failure(name_ + ": is written, but the disk did not confirm its name: " +
+                      std::generic_category().message(error));
+    }
+}
+
+int OutputFile::closeDescriptor() noexcept {
+    return ::close(std::exchange(descriptor_, -1)) == 0 ? 0 : errno;
 }
 
 }  // namespace VexaTouch::Tools

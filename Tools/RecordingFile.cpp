@@ -67,7 +67,7 @@ RecordingFile readRecording(const std::string& path, Streams& streams) {
 }
 
 void writeRecording(const FrameList& frames, const std::string& path, Streams& streams) {
-    OutputFile file(path, streams);
+    OutputFile file(path, streams, OutputFile::Content::Derivable);
     ContainerWriter writer([&file](std::string_view piece) { file.write(piece); });
     Progress progress(streams, "writing " + file.name(), frames.size());
     std::uint64_t written = 0;

@@ -116,7 +116,7 @@ int runSynth(const Arguments& arguments, Streams& streams) {
     const auto seed = numberOption(arguments, "--seed", 0, UINT64_MAX);
     const std::string text = scriptText(arguments, seed.value_or(kDefaultSeed), streams);
     if (arguments.given("--script")) {
-        OutputFile file(arguments.value("--output"), streams);
+        OutputFile file(arguments.value("--output"), streams, OutputFile::Content::Derivable);
         file.write(text);
         file.commit();
         return kExitSuccess;
@@ -127,7 +127,7 @@ int runSynth(const Arguments& arguments, Streams& streams) {
     if (script.frames == 0) {
         throw Failure(name + ": the script makes no frames (add a gesture, or idle 100ms)");
     }
-    OutputFile file(arguments.value("--output"), streams);
+    OutputFile file(arguments.value("--output"), streams, OutputFile::Content::Derivable);
     writeFrames(script, seed, file);
     file.commit();
     streams.error << file.name() << ": " << script.frames << " frames\n";

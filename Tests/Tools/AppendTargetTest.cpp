@@ -79,6 +79,23 @@ TEST_F(AppendTargetTest, FileThatIsThereIsKeptUnlessToBeReplaced) {
     EXPECT_THAT(folder.names(), ElementsAre("old", "other name"));
 }
 
+// So that nothing is left behind when the program is killed.
+TEST_F(AppendTargetTest, ReplacingFileHasNoNameUntilItIsKept) {
+    const std::string path = folder.file("old", "precious");
+    const auto target = open(path, true);
+    target->write(0, "new");
+    EXPECT_THAT(folder.names(), ElementsAre("old"));
+    EXPECT_EQ(target->keep(), 0);
+    EXPECT_THAT(folder.names(), ElementsAre("old"));
+    EXPECT_EQ(contentOf(path), "new");
+}
+
+TEST_F(AppendTargetTest, TellsWhetherSomethingWasThere) {
+    EXPECT_FALSE(open(folder.path("new"))->wasThere());
+    EXPECT_TRUE(open(folder.file("empty", ""))->wasThere());
+    EXPECT_TRUE(open(folder.file("old", "precious"), true)->wasThere());
+}
+
 TEST_F(AppendTargetTest, LinkKeepsPointingWhereItPoints) {
     const std::string path = folder.file("old", "precious");
     const std::string link = folder.path("link");

@@ -17,6 +17,7 @@ namespace {
 using Testing::contentOf;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
+using ::testing::SizeIs;
 using Testing::TemporaryFolder;
 
 class OutputFileTest : public ::testing::Test {
@@ -98,6 +99,30 @@ TEST_F(OutputFileTest, AFullDeviceIsAFailure) {
     } catch (const Failure& failure) {
         EXPECT_STREQ(failure.what(), "/dev/full: cannot write: No space left on device");
     }
+}
+
+TEST_F(OutputFileTest, AFileThatCannotTakeItsNameStaysBesideIt) {
+    const std::string path = folder.file("a.json", "old");
+    std::string fault;
+    {
+        OutputFile file(path, streams);
+        file.write("hours of work");
+        // A folder's name is taken by no file.
+        std::filesystem::remove(path);
+        std::filesystem::create_directory(path);
+        try {
+            file.commit();
+        } catch (const Failure& failure) {
+            fault = failure.what();
+        }
+    }
+    ASSERT_THAT(folder.names(), SizeIs(2));
+    const std::string beside = folder.path(folder.names().front());
+    EXPECT_EQ(contentOf(beside), "hours of work");
+    EXPECT_EQ(fault, path +
+                         ": the new file cannot take its place: Is a directory; what was "
+                         "written is in " +
+                         beside);
 }
 
 TEST_F(OutputFileTest, AMinusIsTheResultStream) {
