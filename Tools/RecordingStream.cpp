@@ -61,11 +61,10 @@ void RecordingStream::finish() {
     }
     keepTarget();
     isDead_ = true;
-    if (const int error = target_->sync(); error != 0) {
-        fail(error);
-    }
-    if (const int error = target_->close(); error != 0) {
-        fail(error);
+    const int unsafe = target_->sync();
+    const int unclosed = target_->close();
+    if (const int error = unsafe != 0 ? unsafe : unclosed; error != 0) {
+        failUnconfirmed(error);
     }
     isFinished_ = true;
 }
@@ -79,7 +78,7 @@ Failure RecordingStream::finishAfter(const std::string& fault) {
         return Failure(fault);
     }
     isDead_ = true;
-    return Failure(fault + "; no report was recorded, " + name_ + " is as it was");
+    return Failure(fault + nothingKeptText());
 }
 
 bool RecordingStream::holdsReport() const noexcept {
@@ -178,20 +177,43 @@ void RecordingStream::syncIfDue() {
     isNew_ = false;
     if (const int error = target_->sync(); error != 0) {
         isDead_ = true;
-        fail(error);
+        failUnconfirmed(error);
     }
 }
 
-void RecordingStream::fail(int error) const {
+void RecordingStream::fail(int error) {
     const std::string fault = name_ + ": cannot write: " + std::generic_category().message(error);
     if (!isKept()) {
-        throw Failure(fault + "; no report had room, it is as it was");
+        throw Failure(fault + nothingKeptText());
     }
-    throw Failure(fault + "; " + framesText() + " safe in it");
+    if (!target_->isRewritable()) {
+        // How much of that has been read nobody knows.
+        throw Failure(fault + "; " + framesText() + " written to it");
+    }
+    throw Failure(fault + "; " + framesText() +
+                  (target_->sync() == 0 ? " safe in it"
+                                        : " in it, but the disk did not confirm " + themText()));
+}
+
+void RecordingStream::failUnconfirmed(int error) {
+    if (!isKept()) {
+        fail(error);
+    }
+    throw Failure(name_ + ": " + framesText() + " written, but the disk did not confirm " +
+                  themText() + ": " + std::generic_category().message(error));
+}
+
+std::string RecordingStream::themText() const {
+    return frames_ == 1 ? "it" : "them";
 }
 
 std::string RecordingStream::framesText() const {
     return std::to_string(frames_) + (frames_ == 1 ? " frame is" : " frames are");
+}
+
+std::string RecordingStream::nothingKeptText() const {
+    return "; no report was recorded" +
+           (target_->wasThere() ? ", " + name_ + " is as it was" : std::string());
 }
 
 }  // namespace VexaTouch::Tools

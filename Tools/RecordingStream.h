@@ -77,8 +77,13 @@ private:
     void keepTarget();
     void saveWhatFits(std::size_t written) noexcept;
     void syncIfDue();
-    [[noreturn]] void fail(int error) const;
+    /// Sees to the safety of what is there.
+    [[noreturn]] void fail(int error);
+    /// What was written is there, but not known to survive the machine's end.
+    [[noreturn]] void failUnconfirmed(int error);
     [[nodiscard]] std::string framesText() const;
+    [[nodiscard]] std::string themText() const;
+    [[nodiscard]] std::string nothingKeptText() const;
 
     std::unique_ptr<AppendTarget> target_;
     const std::string name_;

@@ -232,7 +232,7 @@ TEST_F(RecordCommandTest, FullDiskEndsItWithAWholeFile) {
     EXPECT_GT(contentOf(path).size(), 20U * 1024 - 350);
     EXPECT_THAT(record({"/dev/full"}).error,
                 HasSubstr("vexatouch record: /dev/full: cannot write: No space left on device; 0 "
-                          "frames are safe in it\n"));
+                          "frames are written to it\n"));
 }
 
 TEST_F(RecordCommandTest, DiskWithoutRoomForAFrameLeavesTheOldRecording) {
@@ -243,8 +243,8 @@ TEST_F(RecordCommandTest, DiskWithoutRoomForAFrameLeavesTheOldRecording) {
                              "') 2>&1 | cat > '" + errors + "'";
     ASSERT_NE(std::system(("bash -c \"" + line + "\"").c_str()), -1);
     EXPECT_EQ(contentOf(errors), "vexatouch record: " + path +
-                                     ": cannot write: File too large; no report had room, it is "
-                                     "as it was\n");
+                                     ": cannot write: File too large; no report was recorded, " +
+                                     path + " is as it was\n");
     EXPECT_EQ(contentOf(path), "precious");
     EXPECT_THAT(folder.names(), ElementsAre("errors", "session.json"));
 }
@@ -270,7 +270,7 @@ TEST_F(RecordCommandTest, NobodyReadingThePipeEndsItInOrder) {
     EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 1) << status;
     EXPECT_THAT(program.error(),
                 MatchesRegex("vexatouch record: standard output: cannot write: .*; [0-9]+ frames "
-                             "are safe in it\n"));
+                             "are written to it\n"));
 }
 
 TEST_F(RecordCommandTest, TerminalShowsHowFarItIs) {

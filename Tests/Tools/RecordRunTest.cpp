@@ -276,9 +276,9 @@ TEST_F(RecordRunTest, UnpluggedDeviceThatSentNothingLeavesWhatWasThere) {
             record(device, {}, openAppendTarget(file, true, streams));
             ADD_FAILURE() << "the run does not say that the device is gone";
         } catch (const Failure& failure) {
-            EXPECT_STREQ(failure.what(),
-                         "the device was unplugged; no report was recorded, session.json is as it "
-                         "was");
+            EXPECT_EQ(failure.what(),
+                      std::string("the device was unplugged; no report was recorded") +
+                          (file == old ? ", session.json is as it was" : ""));
         }
     }
     EXPECT_EQ(Testing::contentOf(old), "precious");

@@ -13,6 +13,7 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <filesystem>
 #include <limits>
 #include <memory>
 #include <string>
@@ -43,6 +44,8 @@ struct Disk {
     bool closingFails = false;    ///< whatever comes after the failure fails, too
     int failWith = ENOSPC;
     int syncError = 0;
+    int closeError = 0;
+    bool wasThere = true;
     bool isKept = false;
     int keepError = 0;
     int syncs = 0;
@@ -89,7 +92,8 @@ public:
         ++disk_.syncs;
         return disk_.syncError;
     }
-    int close() noexcept override { return 0; }
+    int close() noexcept override { return disk_.closeError; }
+    [[nodiscard]] bool wasThere() const noexcept override { return disk_.wasThere; }
 
 private:
     Disk& disk_;
@@ -190,7 +194,7 @@ TEST(RecordingStreamTest, WhatCannotBeWrittenOverGetsItsBracketsAtTheEnd) {
 /// What cannot be written over is as good as kept from the beginning.
 std::string failureText(const std::string& fault, std::size_t frames, bool isKept) {
     const std::string begin = "session.json: cannot write: " + fault + "; ";
-    return !isKept ? begin + "no report had room, it is as it was"
+    return !isKept ? begin + "no report was recorded, session.json is as it was"
                    : begin + std::to_string(frames) + (frames == 1 ? " frame is" : " frames are") +
                          " safe in it";
 }
@@ -274,6 +278,7 @@ TEST(RecordingStreamTest, CutAtAnyByteEveryWholeFrameIsRestored) {
     for (std::size_t length = 0; length < disk.content.size(); ++length) {
         SCOPED_TRACE("cut after " + std::to_string(length) + " bytes");
         const std::string cut = folder.file("cut.json", disk.content.substr(0, length));
+        std::filesystem::remove(restored);  // else each waits for the disk
         const std::size_t whole = wholeFrames(frames, length);
         const CommandResult result = runCommand({"convert", "--recover", cut, "-o", restored});
         if (whole == 0) {
@@ -359,7 +364,7 @@ TEST(RecordingStreamTest, FailureOfAnyWriteKeepsTheFramesBeforeIt) {
 TEST(RecordingStreamTest, PipeWithoutReaderSaysHowMuchItGot) {
     Disk disk{.isRewritable = false, .writesUntilFailure = 3, .failWith = EPIPE};
     EXPECT_EQ(record(*streamTo(disk), someFrames()),
-              "session.json: cannot write: Broken pipe; 2 frames are safe in it");
+              "session.json: cannot write: Broken pipe; 2 frames are written to it");
 }
 
 TEST(RecordingStreamTest, SyncsWhenItIsDueAndThereIsSomethingNew) {
@@ -391,10 +396,44 @@ TEST(RecordingStreamTest, SyncsWhenItIsDueAndThereIsSomethingNew) {
         EXPECT_EQ(disk.syncs, 1);
         EXPECT_GT(stream->syncDue(), std::chrono::steady_clock::now());
     }
+}
+
+TEST(RecordingStreamTest, WhatTheDiskDoesNotConfirmIsNotCalledSafe) {
+    const Frames frames = someFrames();
+    const std::string unconfirmed =
+        "session.json: 7 frames are written, but the disk did not confirm them: ";
     Disk broken{.syncError = EIO};
-    EXPECT_EQ(record(*streamTo(broken), frames),
-              "session.json: cannot write: Input/output error; 7 frames are safe in it");
+    EXPECT_EQ(record(*streamTo(broken), frames), unconfirmed + "Input/output error");
     EXPECT_EQ(broken.content, textOf(frames, frames.size()));
+    Disk full{.closeError = EDQUOT};
+    EXPECT_EQ(record(*streamTo(full), frames), unconfirmed + "Disk quota exceeded");
+    // While it goes on, at the first report.
+    Disk early{.syncError = EIO};
+    const auto stream = streamTo(early, std::chrono::hours(1));
+    EXPECT_EQ(record(*stream, {frames[1]}),
+              "session.json: 1 frame is written, but the disk did not confirm it: Input/output "
+              "error");
+    EXPECT_FALSE(stream->isFinished());
+}
+
+TEST(RecordingStreamTest, WhatAFullDiskKeptIsSafeBeforeItIsCalledSo) {
+    const Frames frames = someFrames();
+    Disk disk{.room = textOf(frames, 3).size()};
+    EXPECT_EQ(record(*streamTo(disk), frames), failureText("No space left on device", 3, true));
+    EXPECT_EQ(disk.syncs, 1);
+    Disk broken{.room = disk.room, .syncError = EIO};
+    EXPECT_EQ(record(*streamTo(broken), frames),
+              "session.json: cannot write: No space left on device; 3 frames are in it, but the "
+              "disk did not confirm them");
+}
+
+TEST(RecordingStreamTest, NothingIsAsItWasWhereThereWasNothing) {
+    Disk disk{.writesUntilFailure = 1, .failWith = EIO, .wasThere = false};
+    EXPECT_EQ(record(*streamTo(disk), someFrames()),
+              "session.json: cannot write: Input/output error; no report was recorded");
+    Disk unplugged{.wasThere = false};
+    EXPECT_STREQ(streamTo(unplugged)->finishAfter("the device was unplugged").what(),
+                 "the device was unplugged; no report was recorded");
 }
 
 }  // namespace
