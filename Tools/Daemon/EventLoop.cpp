@@ -7,6 +7,7 @@
 #include <systemd/sd-event.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <exception>
@@ -39,15 +40,22 @@ public:
     void setEvents(std::uint32_t events) { check(sd_event_source_set_io_events(source_, events)); }
     void watchClock(std::chrono::microseconds interval) {
         interval_ = static_cast<std::uint64_t>(interval.count());
-        const std::uint64_t accuracy = interval_ / 16 + 1;
-        check(sd_event_add_time_relative(loop_.get(), &source_, CLOCK_MONOTONIC, interval_,
-                                         accuracy, &elapsed, this));
+        addTime(interval_, interval_ / 16 + 1);
         check(sd_event_source_set_enabled(source_, SD_EVENT_ON));
+    }
+    void waitFor(std::chrono::microseconds time) {
+        // The least there is; 0 would be a quarter of a second.
+        addTime(static_cast<std::uint64_t>(time.count()), 1);
     }
 
     std::function<void(std::uint32_t events)> callback;
 
 private:
+    // Made enabled for once.
+    void addTime(std::uint64_t time, std::uint64_t accuracy) {
+        check(sd_event_add_time_relative(loop_.get(), &source_, CLOCK_MONOTONIC, time, accuracy,
+                                         &elapsed, this));
+    }
     // The callback may end the watch: it is kept until it has returned.
     static int ready(sd_event_source* /*source*/, int /*descriptor*/, std::uint32_t events,
                      void* context) {
@@ -115,6 +123,16 @@ EventLoop::WatchHandle EventLoop::every(std::chrono::microseconds interval,
     WatchHandle made(new Watch(*this));
     made->callback = [callback = std::move(callback)](std::uint32_t) { callback(); };
     made->watchClock(interval);
+    return made;
+}
+
+EventLoop::WatchHandle EventLoop::after(std::chrono::nanoseconds time,
+                                        std::function<void()> callback) {
+    WatchHandle made(new Watch(*this));
+    made->callback = [callback = std::move(callback)](std::uint32_t) { callback(); };
+    // Rounded up: not before its time.
+    made->waitFor(std::chrono::ceil<std::chrono::microseconds>(
+        std::max(time, std::chrono::nanoseconds::zero())));
     return made;
 }
 

@@ -49,6 +49,10 @@ public:
     [[nodiscard]] WatchHandle every(std::chrono::microseconds interval,
                                     std::function<void()> callback);
 
+    /// Calls back once when the time is over, as late as the system makes it and no later. A time
+    /// of 0 calls back in the next turn of the loop.
+    [[nodiscard]] WatchHandle after(std::chrono::nanoseconds time, std::function<void()> callback);
+
     /// Calls back once, in the order of posting. Any thread. May throw std::bad_alloc.
     void post(std::function<void()> callback);
 

@@ -151,10 +151,7 @@ int runMonitor(const Arguments& arguments, Streams& streams) {
     if (!json) {
         streams.out << deliveredEventHeading() << std::flush;
     }
-    const auto deadline =
-        duration ? loop.every(std::chrono::duration_cast<std::chrono::microseconds>(*duration),
-                              [&] { loop.stop(); })
-                 : nullptr;
+    const auto deadline = duration ? loop.after(*duration, [&] { loop.stop(); }) : nullptr;
     loop.run();
     if (lost) {
         throw Failure("the daemon has ended");

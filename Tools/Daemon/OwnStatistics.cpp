@@ -62,8 +62,7 @@ private:
             return;
         }
         if (duration_) {
-            deadline_ = loop_.every(std::chrono::duration_cast<microseconds>(*duration_),
-                                    [this] { finish(); });
+            deadline_ = loop_.after(*duration_, [this] { finish(); });
         }
         lookWatch_ =
             loop_.every(std::chrono::duration_cast<microseconds>(reportWatch_.interval()), [this] {

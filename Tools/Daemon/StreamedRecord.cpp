@@ -10,7 +10,6 @@
 #include <sys/epoll.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <span>
@@ -18,8 +17,6 @@
 
 namespace VexaTouch::Tools::Daemon {
 namespace {
-
-using std::chrono::microseconds;
 
 /// Reads frames from a descriptor and writes them until there is a reason to end.
 class StreamWriter {
@@ -43,8 +40,7 @@ public:
         });
         frameWatch_ = loop_.watch(frames.get(), EPOLLIN, [this](std::uint32_t) { read(); });
         if (options.duration) {
-            deadline_ = loop_.every(std::chrono::duration_cast<microseconds>(*options.duration),
-                                    [this] { loop_.stop(); });
+            deadline_ = loop_.after(*options.duration, [this] { loop_.stop(); });
         }
         if (streams.errorIsTerminal) {
             constexpr auto kDrawInterval = std::chrono::milliseconds(100);
@@ -85,9 +81,7 @@ private:
         // When nothing comes any more, what came last is made safe in time all the same.
         const auto due = stream_.syncDue();
         if (due && !syncWatch_) {
-            const auto left =
-                std::chrono::duration_cast<microseconds>(*due - std::chrono::steady_clock::now());
-            syncWatch_ = loop_.every(std::max(left, microseconds(0)) + microseconds(1), [this] {
+            syncWatch_ = loop_.after(*due - std::chrono::steady_clock::now(), [this] {
                 syncWatch_.reset();
                 flush();
             });
