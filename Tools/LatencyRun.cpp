@@ -157,10 +157,6 @@ LatencyResult resultOf(const LatencyProbe& probe, const ReaderTurns& turns, bool
     return result;
 }
 
-}  // namespace
-
-namespace {
-
 /// A service on a device, the probe that listens to it and the reader of its recording.
 class Measurement {
 public:
@@ -264,18 +260,13 @@ std::vector<LatencyResult> measureLive(const LatencyRunOptions& options) {
         },
         [&] {
             ReportWatch watch(*options.live, options.patience);
-            WakeUp::Time nextLook = std::chrono::steady_clock::now() + watch.interval();
             while (handled.load() < wanted && !unplugged &&
                    (!until || std::chrono::steady_clock::now() < *until)) {
-                unplugged = wake.wait(until ? std::min(*until, nextLook) : nextLook,
-                                      options.live->hangUpDescriptor());
-                if (std::chrono::steady_clock::now() < nextLook) {
-                    continue;
-                }
-                nextLook += watch.interval();
-                if (watch.look()) {
+                if (watch.lookIfDue(std::chrono::steady_clock::now())) {
                     throw Failure(ReportWatch::kFault);
                 }
+                unplugged = wake.wait(until ? std::min(*until, watch.nextLook()) : watch.nextLook(),
+                                      options.live->hangUpDescriptor());
             }
         });
     if (unplugged) {

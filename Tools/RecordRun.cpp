@@ -72,10 +72,9 @@ RecordSummary RecordRun::run(RecordingStream& stream) {
     if (options_.duration) {
         deadline_ = start + *options_.duration;
     }
-    nextLook_ = start + watch_.interval();
     for (bool any = takeFrames(); !isOver(); any = takeFrames()) {
         keeper_->drawProgress();
-        lookAfterReports();
+        stuck_ = watch_.lookIfDue(std::chrono::steady_clock::now());
         answerUserSignal();
         // A feed that was not empty wakes nobody.
         if (!any) {
@@ -106,7 +105,7 @@ bool RecordRun::isOver() {
 }
 
 void RecordRun::waitForWork() {
-    Time until = nextLook_;
+    Time until = watch_.nextLook();
     const auto noLaterThan = [&until](Time time) { until = std::min(until, time); };
     if (deadline_) {
         noLaterThan(*deadline_);
@@ -122,14 +121,6 @@ void RecordRun::waitForWork() {
         wake_.wait(until);
     } else if (wake_.wait(until, device_->hangUpDescriptor())) {
         unplugged_ = true;
-    }
-}
-
-void RecordRun::lookAfterReports() {
-    const Time now = std::chrono::steady_clock::now();
-    if (now >= nextLook_) {
-        nextLook_ = now + watch_.interval();
-        stuck_ = watch_.look();
     }
 }
 

@@ -72,7 +72,6 @@ private:
     void installHooks();
     [[nodiscard]] bool isOver();
     void waitForWork();
-    void lookAfterReports();
     void answerUserSignal();
     bool takeFrames();
     void holdBack() noexcept;
@@ -90,7 +89,6 @@ private:
     std::optional<RecordKeeper> keeper_;  // from then on
     std::optional<Time> deadline_;
     ReportWatch watch_;
-    Time nextLook_;
     bool stuck_ = false;
     // The device's player waits for the second to change while the first is false.
     std::atomic<bool> noHoldBack_;

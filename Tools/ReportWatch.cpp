@@ -14,4 +14,12 @@ bool ReportWatch::look() noexcept {
     return inVain_ >= kLooks;
 }
 
+bool ReportWatch::lookIfDue(Time now) noexcept {
+    const bool isDue = nextLook_ && now >= *nextLook_;
+    if (isDue || !nextLook_) {
+        nextLook_ = now + std::chrono::duration_cast<Time::duration>(interval_);
+    }
+    return isDue && look();
+}
+
 }  // namespace VexaTouch::Tools

@@ -4,6 +4,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <optional>
 
 namespace VexaTouch::Tools {
 
@@ -23,12 +24,20 @@ public:
     ReportWatch(const ObservedDevice& device, std::chrono::nanoseconds patience) noexcept
         : device_(device), interval_(patience / kLooks) {}
 
+    using Time = std::chrono::steady_clock::time_point;
+
     /// The time from one look to the next.
     [[nodiscard]] std::chrono::nanoseconds interval() const noexcept { return interval_; }
 
     /// To be called once in each interval. True when reports have been waiting in vain, or nobody
     /// has been there to read them, for so many looks in a row that the patience is at its end.
     [[nodiscard]] bool look() noexcept;
+
+    /// look() if it is time for it. The first time only begins the first interval. However late it
+    /// is called, the next look is a whole interval away.
+    [[nodiscard]] bool lookIfDue(Time now) noexcept;
+    /// When lookIfDue is to be called again, once it has been.
+    [[nodiscard]] Time nextLook() const noexcept { return nextLook_.value_or(Time::max()); }
 
 private:
     static constexpr int kLooks = 10;
@@ -37,6 +46,7 @@ private:
     std::chrono::nanoseconds interval_;
     std::uint64_t handled_ = 0;
     int inVain_ = 0;
+    std::optional<Time> nextLook_;
 };
 
 }  // namespace VexaTouch::Tools

@@ -51,6 +51,22 @@ TEST_F(ReportWatchTest, ReportsThatNobodyTakesEndThePatience) {
     EXPECT_TRUE(watch.look());
 }
 
+// The process was stopped: the service has had no time either.
+TEST_F(ReportWatchTest, ALateLookIsFollowedByAWholeInterval) {
+    const auto start = ReportWatch::Time() + std::chrono::hours(1);
+    EXPECT_FALSE(watch.lookIfDue(start));
+    EXPECT_EQ(watch.nextLook(), start + watch.interval());
+    const auto late = start + std::chrono::minutes(10);
+    for (int look = 0; look < 2 * kLooks; ++look) {
+        EXPECT_FALSE(watch.lookIfDue(late)) << look;
+        EXPECT_EQ(watch.nextLook(), late + watch.interval());
+    }
+    for (int look = 2; look < kLooks; ++look) {
+        EXPECT_FALSE(watch.lookIfDue(watch.nextLook())) << look;
+    }
+    EXPECT_TRUE(watch.lookIfDue(watch.nextLook()));
+}
+
 TEST_F(ReportWatchTest, AServiceThatTakesOneInTimeHasAllTheTimeForTheNext) {
     for (int report = 1; report < kReports; ++report) {
         for (int look = 1; look < kLooks; ++look) {
