@@ -2,6 +2,7 @@
 
 #include "Host/HostFailure.h"
 #include "Host/SurfaceWatch.h"
+#include "Tools/EventInbox.h"
 #include "Tools/Failure.h"
 #include "Tools/HidrawSource.h"
 #include "Tools/InputFile.h"
@@ -12,6 +13,7 @@
 
 #include <charconv>
 #include <cmath>
+#include <limits>
 #include <stdexcept>
 #include <utility>
 #include <vector>
@@ -149,6 +151,15 @@ DeviceChoice DeviceChoice::parse(std::string_view text, std::string_view option)
     refuse(given,
            "expected sim, sim:SCRIPT, recording:FILE (with @2 or @max behind the file for a "
            "speed), hidraw or hidraw:NODE");
+}
+
+bool comesToAnEnd(const DeviceChoice& choice, const DeviceWishes& wishes) noexcept {
+    return choice.kind != DeviceChoice::Kind::Hidraw && !choice.path.empty() && !wishes.endless;
+}
+
+std::size_t eventRoom(const DeviceChoice& choice, const DeviceWishes& wishes) noexcept {
+    return comesToAnEnd(choice, wishes) ? std::numeric_limits<std::size_t>::max()
+                                        : EventInbox::kUsualRoom;
 }
 
 Host::SurfaceMatch matchOption(const Arguments& arguments) {

@@ -6,6 +6,7 @@
 #include "Tools/PlayedDevice.h"
 #include "Tools/Streams.h"
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -32,9 +33,6 @@ struct DeviceChoice {
     /// Throws UsageError, which names `option`.
     static DeviceChoice parse(std::string_view text, std::string_view option = "--device");
 
-    /// Whether it plays something that comes to an end.
-    [[nodiscard]] bool ends() const noexcept { return kind != Kind::Hidraw && !path.empty(); }
-
     friend bool operator==(const DeviceChoice&, const DeviceChoice&) = default;
 };
 
@@ -50,6 +48,13 @@ struct DeviceWishes {
     /// Which devices are surfaces, for a hidraw device that is not named by its node.
     Host::SurfaceMatch match = {};
 };
+
+/// Whether the device plays something that comes to an end.
+[[nodiscard]] bool comesToAnEnd(const DeviceChoice& choice, const DeviceWishes& wishes) noexcept;
+/// How many events may wait for a slow reader. A device that comes to an end has so many and no
+/// more, and none may be missing in the end; one that does not must not fill the memory.
+[[nodiscard]] std::size_t eventRoom(const DeviceChoice& choice,
+                                    const DeviceWishes& wishes) noexcept;
 
 /// Help of the option --device for the command table.
 inline constexpr std::string_view kDeviceHelp =
@@ -100,10 +105,10 @@ Host::SurfaceMatch matchOption(const Arguments& arguments);
 /// Throws UsageError.
 Host::SurfaceMatch matchOption(const Arguments& arguments, const DeviceChoice& choice);
 
+/// The seed of the simulated surface, if one was given. Throws UsageError with any other device.
+std::optional<std::uint64_t> seedOption(const Arguments& arguments, const DeviceChoice& choice);
 /// What --seed, --rate, --endless and --match say; the command must have all four. Throws
 /// UsageError, also when one is given for a device that has no use of it.
-/// The seed of random gestures, if one was given. Throws UsageError with any other device.
-std::optional<std::uint64_t> seedOption(const Arguments& arguments, const DeviceChoice& choice);
 DeviceWishes deviceWishes(const Arguments& arguments, const DeviceChoice& choice);
 
 /// For a command that talks to the daemon because it was given no device of its own: none of these

@@ -123,7 +123,7 @@ Properties readFromOwnDevice(const Arguments& arguments, const std::vector<std::
     HostedDevice hosted(
         makeDevice(choice, wishes, streams), [](const Vexa::HidEvent&) {}, streams.patience);
     hosted.begin();
-    if (choice.ends()) {
+    if (comesToAnEnd(choice, wishes)) {
         hosted.waitUntilPlayed();
     }
     const Reader read = [&](const std::string& key) {

@@ -13,10 +13,8 @@
 #include "Tools/WakeUp.h"
 
 #include <array>
-#include <cstddef>
 #include <cstdint>
 #include <filesystem>
-#include <limits>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -156,10 +154,7 @@ int runRun(const Arguments& arguments, Streams& streams) {
         keyboard = makeKeyboard(options.keyMap, "run", streams);
         options.keyboard = keyboard.get();
     }
-    if (choice.ends()) {
-        // It has so many and no more, and none may be missing in the end, however slow the reader.
-        options.eventRoom = std::numeric_limits<std::size_t>::max();
-    }
+    options.eventRoom = eventRoom(choice, wishes);
     LiveRun(library, device, std::move(options), signals, wake, streams).run();
     return kExitSuccess;
 }

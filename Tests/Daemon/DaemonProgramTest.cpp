@@ -253,6 +253,15 @@ TEST_F(DaemonProgramTest, StatsOfAnOwnDeviceAreThoseOfTheDaemon) {
     }
 }
 
+TEST_F(DaemonProgramTest, ASeedIsRefusedForWhatDrawsNoNumbers) {
+    for (const char* command : {"stats", "monitor"}) {
+        const CommandResult result =
+            runCommand({command, "--seed", "1", "--device", example("taps")});
+        EXPECT_EQ(result.exitCode, 2) << command;
+        EXPECT_THAT(result.error, HasSubstr("--seed is for a simulated surface"));
+    }
+}
+
 TEST_F(DaemonProgramTest, StatsOfAnOwnDeviceEndAfterATimeOrAtASignal) {
     const CommandResult timed = runCommand({"stats", "--device", "sim", "--duration", "50ms"});
     EXPECT_EQ(timed.exitCode, 0) << timed.error;

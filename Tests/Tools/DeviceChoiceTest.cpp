@@ -11,12 +11,14 @@
 
 #include <array>
 #include <cstddef>
+#include <cstdint>
 #include <filesystem>
 #include <list>
 #include <memory>
 #include <ostream>
 #include <sstream>
 #include <string>
+#include <string_view>
 #include <utility>
 
 namespace VexaTouch::Tools {
@@ -62,9 +64,20 @@ TEST(DeviceChoiceTest, ADeviceOfTheKernelIsTheFirstOrThatOfANode) {
     EXPECT_EQ(refusal("hidraw:"),
               "--device hidraw:: the node is missing (without the colon: the first surface there "
               "is)");
-    EXPECT_FALSE(DeviceChoice::parse("hidraw:/dev/hidraw1").ends());
-    EXPECT_FALSE(DeviceChoice::parse("sim").ends());
-    EXPECT_TRUE(DeviceChoice::parse("sim:a").ends());
+}
+
+TEST(DeviceChoiceTest, OnlyWhatComesToAnEndHasRoomForAllOfItsEvents) {
+    const auto room = [](std::string_view text, bool endless = false) {
+        const DeviceWishes wishes{.endless = endless};
+        const DeviceChoice choice = DeviceChoice::parse(text);
+        EXPECT_EQ(comesToAnEnd(choice, wishes), eventRoom(choice, wishes) == SIZE_MAX) << text;
+        return eventRoom(choice, wishes);
+    };
+    EXPECT_EQ(room("hidraw:/dev/hidraw1"), 65'536U);
+    EXPECT_EQ(room("sim"), 65'536U);
+    EXPECT_EQ(room("sim:a"), SIZE_MAX);
+    EXPECT_EQ(room("sim:a", true), 65'536U);
+    EXPECT_EQ(room("recording:a@max"), SIZE_MAX);
 }
 
 TEST(DeviceChoiceTest, ARecordingMayHaveASpeed) {

@@ -63,8 +63,9 @@ int runOwn(const Arguments& arguments, Streams& streams) {
     options.count = numberOption(arguments, "--count", 1, UINT64_MAX);
     const DeviceChoice choice = DeviceChoice::parse(arguments.value(kOwnDeviceOption.name));
     DeviceWishes wishes;
-    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.seed = seedOption(arguments, choice);
     wishes.match = matchOption(arguments, choice);
+    options.eventRoom = eventRoom(choice, wishes);
     const WakeUp wake;
     SignalWatch signals(wake);
     const auto device = makeDevice(choice, wishes, streams);

@@ -98,7 +98,7 @@ int runOwn(const Arguments& arguments, Streams& streams) {
     const std::string text = arguments.value(kOwnDeviceOption.name);
     const DeviceChoice choice = DeviceChoice::parse(text);
     DeviceWishes wishes;
-    wishes.seed = numberOption(arguments, kSeedOption.name, 0, UINT64_MAX);
+    wishes.seed = seedOption(arguments, choice);
     wishes.match = matchOption(arguments, choice);
     const auto duration = durationOption(arguments, kDurationOption.name);
     // Signals are set up before there is any other thread, so that none is bothered by them.
