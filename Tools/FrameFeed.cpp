@@ -28,9 +28,11 @@ enum RecordType : std::uint32_t {
     kReport = 1,  // its bytes
     kState = 2,   // the length of the key in 32 bits, the key, the value as JSON
     kGap = 3,     // lost reports, lost settings, 64 bits each
+    kEnd = 4,     // nothing comes any more
 };
 
 constexpr std::size_t kGapBytes = sizeof(Header) + sizeof(FrameGap);
+constexpr std::size_t kEndBytes = kGapBytes + sizeof(Header);
 // More than any feed has room for.
 constexpr std::uint32_t kLongestPayload = std::uint32_t{1} << 28U;
 
@@ -99,7 +101,7 @@ FrameFeed::FrameFeed(std::function<void()> wake, std::size_t bytes)
 
 void FrameFeed::putReport(std::span<const std::uint8_t> report,
                           std::uint64_t timestampNs) noexcept {
-    if (!tryPut(Record(kReport, timestampNs, {report, {}, {}}), kGapBytes + forSettings_)) {
+    if (!tryPut(Record(kReport, timestampNs, {report, {}, {}}), kEndBytes + forSettings_)) {
         ++gap_.reports;
         lostReports_.fetch_add(1, std::memory_order_relaxed);
     }
@@ -109,19 +111,23 @@ void FrameFeed::putState(std::string_view key, std::string_view json,
                          std::uint64_t timestampNs) noexcept {
     const auto keyLength = static_cast<std::uint32_t>(key.size());
     const Record record(kState, timestampNs, {bytesOf(keyLength), bytesOf(key), bytesOf(json)});
-    if (!tryPut(record, kGapBytes)) {
+    if (!tryPut(record, kEndBytes)) {
         ++gap_.settings;
         lostSettings_.fetch_add(1, std::memory_order_relaxed);
     }
 }
 
 void FrameFeed::close() noexcept {
-    if (gap_ != FrameGap{}) {
-        // There is always room for it.
-        const FrameGap gap = std::exchange(gap_, {});
-        publish(
-            append(put_.load(std::memory_order_relaxed), Record(kGap, 0, {bytesOf(gap), {}, {}})));
+    if (closed_.load()) {
+        return;
     }
+    // There is always room for both.
+    std::uint64_t end = put_.load(std::memory_order_relaxed);
+    if (gap_ != FrameGap{}) {
+        end = append(end, Record(kGap, 0, {bytesOf(gap_), {}, {}}));
+        gap_ = {};
+    }
+    publish(append(end, Record(kEnd, 0, {})));
     closed_.store(true);
     wake_();
 }
@@ -268,6 +274,8 @@ void FrameDecoder::take(std::uint32_t type, std::uint64_t timestampNs,
         sink_.onFrame(frame_);
     } else if (type == kGap && payload.size() == sizeof(FrameGap)) {
         sink_.onGap(valueAt<FrameGap>(payload));
+    } else if (type == kEnd && payload.empty()) {
+        isAtEnd_ = true;
     } else {
         refuse("a record is of no known type");
     }

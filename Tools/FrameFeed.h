@@ -108,12 +108,16 @@ public:
     /// is nothing at all.
     [[nodiscard]] bool isBetweenFrames() const noexcept { return pending_.empty() && begun_; }
 
+    /// Whether the feed was closed: everything that was put has come.
+    [[nodiscard]] bool isAtEnd() const noexcept { return isAtEnd_; }
+
 private:
     [[nodiscard]] std::size_t takeOne(std::span<const std::uint8_t> bytes);
     void take(std::uint32_t type, std::uint64_t timestampNs, std::span<const std::uint8_t> payload);
 
     Sink sink_;
     bool begun_ = false;
+    bool isAtEnd_ = false;
     std::vector<std::uint8_t> pending_;
     RecordedFrame frame_;
 };

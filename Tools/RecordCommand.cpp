@@ -15,7 +15,9 @@
 #include "Tools/WakeUp.h"
 
 #include <array>
+#include <csignal>
 #include <cstdint>
+#include <ctime>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -61,7 +63,7 @@ constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
     {kExitFailure,
      "the plug-in or the device cannot be used, the device was unplugged, the file could not be "
      "written on, or inputs were lost because it was not written quickly enough; what was written "
-     "is kept and can be read"},
+     "is kept and can be read if there is a report among it"},
     {kExitUsage, "the command line is wrong, an unknown setting included"},
 }};
 
@@ -130,6 +132,31 @@ int printSummary(const RecordingStream& stream, const RecordSummary& summary, St
     return kExitFailure;
 }
 
+/// Keeps SIGUSR1 until there is somebody to answer it. One thread.
+class UserSignalKept {
+public:
+    UserSignalKept() noexcept {
+        sigemptyset(&set_);
+        sigaddset(&set_, SIGUSR1);
+        pthread_sigmask(SIG_BLOCK, &set_, &previous_);
+    }
+    ~UserSignalKept() {
+        // Nobody is going to.
+        constexpr timespec kAtOnce{};
+        while (sigtimedwait(&set_, nullptr, &kAtOnce) > 0) {
+        }
+        pthread_sigmask(SIG_SETMASK, &previous_, nullptr);
+    }
+    UserSignalKept(const UserSignalKept&) = delete;
+    UserSignalKept(UserSignalKept&&) = delete;
+    UserSignalKept& operator=(const UserSignalKept&) = delete;
+    UserSignalKept& operator=(UserSignalKept&&) = delete;
+
+private:
+    sigset_t set_{};
+    sigset_t previous_{};
+};
+
 int recordFromDaemon(const Arguments& arguments, Streams& streams) {
     refuseWithoutOwnDevice(
         arguments, std::array{kSetOption, kSeedOption, kRateOption, kEndlessOption, kMatchOption});
@@ -138,13 +165,17 @@ int recordFromDaemon(const Arguments& arguments, Streams& streams) {
         .count = numberOption(arguments, "--count", 1, UINT64_MAX)};
     const auto syncEvery = durationOption(arguments, "--sync");
     const std::string file = arguments.value("FILE");
+    const UserSignalKept userSignal;
     Daemon::DaemonClient client(arguments.value(kBusOption.name));
     const FileDescriptor frames = client.recordStream(client.choose(arguments));
+    // Not before: a bus that does not answer can be left. But before there is a file.
+    const WakeUp wake;
+    SignalWatch signals(wake);
     RecordingStream stream(openAppendTarget(file, arguments.given("--force"), streams),
                            file == "-" ? "standard output" : file, syncEvery);
     RecordSummary summary;
     try {
-        Daemon::recordStreamed(frames, options, stream, summary, streams);
+        Daemon::recordStreamed(frames, options, stream, summary, signals, wake, streams);
     } catch (...) {
         printSummary(stream, summary, streams);
         throw;

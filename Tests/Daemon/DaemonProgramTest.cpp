@@ -6,15 +6,19 @@
 #include "Tests/Tools/CommandRun.h"
 #include "Tests/Tools/ProgramOnTerminal.h"
 #include "Tests/Tools/ProgramRun.h"
+#include "Tests/Tools/VexatouchProgram.h"
 #include "Tools/Daemon/BusNames.h"
 #include "Tools/EventRecord.h"
 #include "Tools/Failure.h"
+#include "Tools/FileDescriptor.h"
 #include "Tools/RecordingFile.h"
 
 #include <gmock/gmock.h>
 
 #include <fcntl.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -36,6 +40,7 @@ namespace {
 using ::testing::AllOf;
 using ::testing::Field;
 using ::testing::HasSubstr;
+using ::testing::MatchesRegex;
 using ::testing::SizeIs;
 using ::testing::StartsWith;
 using Vexa::PropertyValue;
@@ -402,6 +407,61 @@ TEST_F(DaemonProgramTest, ARecordingFromTheDaemonAnswersTheUserSignalAndGoesOn) 
     ASSERT_TRUE(record.readErrorUntil("is whole without SIGUSR1\n")) << record.error();
     record.signal(SIGTERM);
     EXPECT_TRUE(endedWith(record.end(), 0)) << record.error();
+}
+
+TEST_F(DaemonProgramTest, ARecordingFromTheDaemonEndsAfterATimeAndIsSafeSoOften) {
+    DaemonUnderTest daemon(bus->address());
+    daemon.source.plug(playedSurface("7", "sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture", true));
+    while (runCommand(atBus({"stats"})).out.find("running") == std::string::npos) {
+    }
+    const std::string file = folder.path("session.json");
+    const CommandResult result =
+        runCommand(atBus({"record", file, "--duration", "300ms", "--sync", "10ms"}));
+    EXPECT_EQ(result.exitCode, 0) << result;
+    EXPECT_THAT(result.error, MatchesRegex(".*/session.json: [0-9]+ reports? and [0-9]+ settings, "
+                                           "[0-9]+ bytes\n"));
+    EXPECT_EQ(runCommand({"info", file}).exitCode, 0);
+}
+
+TEST_F(DaemonProgramTest, AFullDiskEndsARecordingFromTheDaemonWithAWholeFile) {
+    DaemonUnderTest daemon(bus->address());
+    daemon.source.plug(playedSurface("7", "sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture", true));
+    while (runCommand(atBus({"stats"})).out.find("running") == std::string::npos) {
+    }
+    const std::string file = folder.path("session.json");
+    const std::string errors = folder.path("errors");
+    // No file may be longer than 20 blocks of 1024 bytes.
+    const std::string line = "ulimit -f 20; exec '" + std::string(vexatouchProgram()) +
+                             "' record '" + file + "' --bus '" + bus->address() + "' 2> '" +
+                             errors + "'";
+    const int status = std::system(("bash -c \"" + line + "\"").c_str());
+    EXPECT_TRUE(endedWith(status, 1)) << status;
+    EXPECT_THAT(contentOf(errors), MatchesRegex("vexatouch record: .*/session.json: cannot write: "
+                                                "File too large; [0-9]+ frames are safe in it\n"));
+    EXPECT_EQ(runCommand({"info", file}).exitCode, 0);
+}
+
+TEST_F(DaemonProgramTest, MonitorEndsAfterATime) {
+    const DaemonUnderTest daemon(bus->address());
+    EXPECT_EQ(runCommand(atBus({"monitor", "--json", "--duration", "20ms"})),
+              (CommandResult{0, "", "watching 0 surfaces\n"}));
+}
+
+// Whoever asks how much there is does not end it, and Ctrl-C does.
+TEST_F(DaemonProgramTest, ARecordingThatWaitsForTheBusOutlivesTheUserSignalAlone) {
+    const std::string path = folder.path("silent");
+    const Tools::FileDescriptor listening(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
+    path.copy(address.sun_path, sizeof address.sun_path - 1);
+    ASSERT_EQ(::bind(listening.get(), reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
+    ASSERT_EQ(::listen(listening.get(), 1), 0);
+    ProgramRun record({"record", folder.path("session.json"), "--bus", "unix:path=" + path});
+    const Tools::FileDescriptor silent(::accept(listening.get(), nullptr, nullptr));
+    record.signal(SIGUSR1);
+    record.signal(SIGTERM);
+    const int status = record.end();
+    EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == SIGTERM) << status;
+    EXPECT_THAT(folder.names(), ::testing::Not(::testing::Contains("session.json")));
 }
 
 TEST_F(DaemonProgramTest, MonitorPrintsTheEventsOfTheService) {

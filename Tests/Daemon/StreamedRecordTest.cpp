@@ -42,7 +42,7 @@ protected:
     std::string record(const std::string& path) {
         RecordingStream stream(openAppendTarget(path, true, streams), "session.json");
         try {
-            recordStreamed(frames, {}, stream, summary, streams);
+            recordStreamed(frames, {}, stream, summary, signals, wake, streams);
         } catch (const Failure& failure) {
             return failure.what();
         }
@@ -58,6 +58,8 @@ protected:
     FileDescriptor frames;
     FileDescriptor farEnd;
     RecordSummary summary;
+    WakeUp wake;
+    SignalWatch signals{wake};
 };
 
 TEST_F(StreamedRecordTest, FarEndThatGoesLeavesTheSummaryWithWhatWasLost) {
@@ -70,6 +72,7 @@ TEST_F(StreamedRecordTest, FarEndThatGoesLeavesTheSummaryWithWhatWasLost) {
     ASSERT_GT(lost, 0U);
     send();
     feed.putReport(report, kReports);  // the gap goes before it
+    feed.close();
     send();
     farEnd = FileDescriptor();
     EXPECT_EQ(record(folder.path("session.json")),
@@ -77,6 +80,16 @@ TEST_F(StreamedRecordTest, FarEndThatGoesLeavesTheSummaryWithWhatWasLost) {
     EXPECT_EQ(summary.lost.reports, lost);
     EXPECT_EQ(summary.reports, kReports + 1 - lost);
     EXPECT_THAT(folder.names(), ::testing::ElementsAre("session.json"));
+}
+
+// The daemon was killed, or could not wait for a slow reader.
+TEST_F(StreamedRecordTest, FarEndThatGoesWithoutAnEndIsSaidToBeCut) {
+    feed.putReport(std::vector<std::uint8_t>(20, 1), 1);
+    send();
+    farEnd = FileDescriptor();
+    EXPECT_EQ(record(folder.path("session.json")),
+              "the surface was unplugged, or the daemon has ended, and what came last is missing");
+    EXPECT_EQ(summary.reports, 1U);
 }
 
 TEST_F(StreamedRecordTest, FailureWithoutAReportLeavesWhatWasThere) {
@@ -90,9 +103,10 @@ TEST_F(StreamedRecordTest, FailureWithoutAReportLeavesWhatWasThere) {
     EXPECT_EQ(Testing::contentOf(old), "precious");
     // And where it is gone.
     farEnd = FileDescriptor();
-    EXPECT_EQ(record(old),
-              "the surface was unplugged, or the daemon has ended; no report was recorded, "
-              "session.json is as it was");
+    EXPECT_EQ(
+        record(old),
+        "the surface was unplugged, or the daemon has ended, and what came last is missing; no "
+        "report was recorded, session.json is as it was");
     EXPECT_EQ(Testing::contentOf(old), "precious");
     EXPECT_THAT(folder.names(), ::testing::ElementsAre("old.json"));
 }

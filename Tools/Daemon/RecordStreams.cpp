@@ -101,6 +101,18 @@ void RecordStreams::abandon(const std::shared_ptr<FrameFeed>& feed) {
     }
 }
 
+void RecordStreams::end(std::chrono::nanoseconds patience, std::function<void()> done) {
+    done_ = std::move(done);
+    patience_ = loop_.after(
+        streams_.empty() ? std::chrono::nanoseconds::zero() : patience, [this] {
+            const auto ended = std::exchange(done_, nullptr);
+            while (!streams_.empty()) {
+                finish(streams_.front());
+            }
+            ended();
+        });
+}
+
 std::size_t RecordStreams::count(const std::string& owner) const {
     return static_cast<std::size_t>(std::ranges::count(streams_, owner, &Stream::owner));
 }
@@ -152,6 +164,9 @@ void RecordStreams::finish(Stream& stream) {
         tap->remove(stream.feed);
     }
     streams_.remove_if([&stream](const Stream& each) { return &each == &stream; });
+    if (streams_.empty() && done_) {
+        end(std::chrono::nanoseconds::zero(), std::move(done_));
+    }
 }
 
 }  // namespace VexaTouch::Tools::Daemon

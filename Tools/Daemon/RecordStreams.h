@@ -5,6 +5,7 @@
 #include "Tools/FrameFeed.h"
 #include "Tools/InputTap.h"
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
@@ -40,6 +41,11 @@ public:
     /// It is not going to be.
     void abandon(const std::shared_ptr<FrameFeed>& feed);
 
+    /// Calls back, from the loop, when all streams have been taken to their ends, or after that
+    /// time: what is left then is cut, which its reader sees from the missing end. The feeds are
+    /// closed or about to be; none is opened any more.
+    void end(std::chrono::nanoseconds patience, std::function<void()> done);
+
     [[nodiscard]] std::size_t count(const std::string& owner) const;
     /// Reports that streams of this owner which are open had to leave out.
     [[nodiscard]] std::uint64_t lost(const std::string& owner) const;
@@ -53,6 +59,8 @@ private:
 
     EventLoop& loop_;
     std::list<Stream> streams_;
+    std::function<void()> done_;  // of end()
+    EventLoop::WatchHandle patience_;
 };
 
 }  // namespace VexaTouch::Tools::Daemon

@@ -3,8 +3,6 @@
 #include "Tools/Daemon/EventLoop.h"
 #include "Tools/Failure.h"
 #include "Tools/FrameFeed.h"
-#include "Tools/SignalWatch.h"
-#include "Tools/WakeUp.h"
 
 #include <fcntl.h>
 #include <sys/epoll.h>
@@ -14,6 +12,7 @@
 #include <cerrno>
 #include <span>
 #include <stdexcept>
+#include <string>
 
 namespace VexaTouch::Tools::Daemon {
 namespace {
@@ -22,15 +21,16 @@ namespace {
 class StreamWriter {
 public:
     StreamWriter(const FileDescriptor& frames, const StreamedRecordOptions& options,
-                 RecordingStream& stream, RecordSummary& summary, Streams& streams)
+                 RecordingStream& stream, RecordSummary& summary, SignalWatch& signals,
+                 const WakeUp& wake, Streams& streams)
         : frames_(frames),
           stream_(stream),
           summary_(summary),
           keeper_(stream, options.count, streams),
-          signals_(wake_),
+          signals_(signals),
           decoder_({.onFrame = [this](const RecordedFrame& frame) { keeper_.take(frame); },
                     .onGap = [this](const FrameGap& gap) { keeper_.take(gap); }}) {
-        signalWatch_ = loop_.watch(wake_, [this] {
+        signalWatch_ = loop_.watch(wake, [this] {
             if (signals_.takeRecordingWanted()) {
                 keeper_.tellHowMuchThereIs();
             }
@@ -58,6 +58,7 @@ public:
         end();
     }
     [[nodiscard]] bool isFarEndGone() const { return gone_; }
+    [[nodiscard]] bool isWhole() const { return decoder_.isAtEnd(); }
 
 private:
     void end() {
@@ -93,8 +94,7 @@ private:
     RecordSummary& summary_;
     RecordKeeper keeper_;
     bool gone_ = false;
-    WakeUp wake_;
-    SignalWatch signals_;
+    SignalWatch& signals_;
     FrameDecoder decoder_;
     EventLoop loop_;
     EventLoop::WatchHandle signalWatch_;
@@ -107,9 +107,10 @@ private:
 }  // namespace
 
 void recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& options,
-                    RecordingStream& stream, RecordSummary& summary, Streams& streams) {
+                    RecordingStream& stream, RecordSummary& summary, SignalWatch& signals,
+                    const WakeUp& wake, Streams& streams) {
     static_cast<void>(::fcntl(frames.get(), F_SETFL, O_NONBLOCK));
-    StreamWriter writer(frames, options, stream, summary, streams);
+    StreamWriter writer(frames, options, stream, summary, signals, wake, streams);
     try {
         writer.run();
     } catch (const Failure&) {
@@ -119,7 +120,9 @@ void recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& o
         throw stream.finishAfter(error.what());
     }
     if (writer.isFarEndGone()) {
-        throw stream.finishAfter("the surface was unplugged, or the daemon has ended");
+        throw stream.finishAfter(
+            std::string("the surface was unplugged, or the daemon has ended") +
+            (writer.isWhole() ? "" : ", and what came last is missing"));
     }
     stream.finish();
 }
