@@ -3,6 +3,7 @@
 #include "Tools/RecordKeeper.h"
 
 #include <algorithm>
+#include <utility>
 
 namespace VexaTouch::Tools {
 namespace {
@@ -23,20 +24,23 @@ void RecordingSummary::add(const PlayedFrame& played, const Algs& algs) {
     const std::uint64_t timeNs = played.frame->timestamp;
     earliestNs_ = std::min(earliestNs_.value_or(timeNs), timeNs);
     latestNs_ = std::max(latestNs_, timeNs);
+    const bool wasLostReports = std::exchange(isBehindLostReports_, false);
     if (played.type == PlayedType::State) {
-        addState(*played.frame);
+        addState(*played.frame, wasLostReports);
     } else if (played.type == PlayedType::Image) {
         addImage(played, algs);
     }
 }
 
-void RecordingSummary::addState(const RecordedFrame& frame) {
+void RecordingSummary::addState(const RecordedFrame& frame, bool isBehindLostReports) {
     if (frame.key == kLostReportsKey) {
         lost_.reports += frame.value.toUnsigned64();
         ++lossPlaces_;
+        isBehindLostReports_ = true;
     } else if (frame.key == kLostSettingsKey) {
         lost_.settings += frame.value.toUnsigned64();
-        ++lossPlaces_;
+        // Of one gap both are told, one behind the other.
+        lossPlaces_ += isBehindLostReports ? 0 : 1;
     } else {
         settings_[frame.key] = frame.value;
     }

@@ -46,7 +46,7 @@ public:
     [[nodiscard]] bool beginsInMidTouch() const noexcept { return beginsInMidTouch_; }
 
 private:
-    void addState(const RecordedFrame& frame);
+    void addState(const RecordedFrame& frame, bool isBehindLostReports);
     void addImage(const PlayedFrame& played, const Algs& algs);
 
     std::optional<std::uint64_t> earliestNs_;
@@ -58,6 +58,7 @@ private:
     std::uint64_t disjointImages_ = 0;
     std::uint64_t clockJumps_ = 0;
     FrameGap lost_;
+    bool isBehindLostReports_ = false;
     std::uint64_t lossPlaces_ = 0;
     Vexa::PropertyValue::Dictionary settings_;
     bool beginsInMidTouch_ = false;

@@ -257,18 +257,20 @@ TEST(InfoCommand, WhatWasLostWhileItWasRecordedIsToldAndWarnedOf) {
         .set("Recording.LostSettings", 1)
         .feel(nothing())
         .set("Recording.LostReports", 3)
+        .feel(nothing())
+        .set("Recording.LostSettings", 2)
         .set("Algs.HoldTimeoutMilliseconds", 300);
     const CommandResult text = runCommand({"info", "-"}, session.text());
     EXPECT_EQ(text.exitCode, 0);
-    EXPECT_EQ(linesOf(text.out).at(7), "  lost         15 reports and 1 setting, at 3 places");
+    EXPECT_EQ(linesOf(text.out).at(7), "  lost         15 reports and 3 settings, at 3 places");
     EXPECT_EQ(text.out.find("Recording."), std::string::npos);
     EXPECT_EQ(
         text.error,
-        "vexatouch info: warning: standard input: 15 reports and 1 setting, at 3 places, were "
+        "vexatouch info: warning: standard input: 15 reports and 3 settings, at 3 places, were "
         "lost while it was recorded; what follows a loss may give other events than the "
         "service gave\n");
     const CommandResult json = runCommand({"info", "--json", "-"}, session.text());
-    EXPECT_NE(json.out.find("\"lost_reports\": 15,\n  \"lost_settings\": 1,\n  \"settings\": {\n"
+    EXPECT_NE(json.out.find("\"lost_reports\": 15,\n  \"lost_settings\": 3,\n  \"settings\": {\n"
                             "    \"Algs.HoldTimeoutMilliseconds\": 300\n"),
               std::string::npos);
     EXPECT_EQ(json.error, text.error);
