@@ -70,9 +70,7 @@ void RecordKeeper::eraseProgress() {
 
 void RecordKeeper::tellHowMuchThereIs() {
     eraseProgress();
-    streams_.error << "vexatouch record: " << stream_.frames() << " frames are in "
-                   << stream_.name() << "; what is written there is whole without SIGUSR1"
-                   << std::endl;
+    streams_.error << "vexatouch record: " << stream_.whereItIs() << std::endl;
 }
 
 std::optional<RecordKeeper::Time> RecordKeeper::progressDue() const noexcept {

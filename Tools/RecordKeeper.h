@@ -32,6 +32,8 @@ public:
     /// Both must outlive it. The time that is shown begins now.
     RecordKeeper(RecordingStream& stream, std::optional<std::uint64_t> count, Streams& streams);
 
+    /// Counts a frame and adds it to the stream, unless it is full. It is written by the stream's
+    /// flush.
     void take(const RecordedFrame& frame);
     /// The file itself says what it lacks.
     void take(const FrameGap& gap);
@@ -41,6 +43,7 @@ public:
 
     /// On a terminal, at most ten times a second.
     void drawProgress();
+    /// On a terminal, before anything else is said there.
     void eraseProgress();
     /// The answer to SIGUSR1.
     void tellHowMuchThereIs();

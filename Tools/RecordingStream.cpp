@@ -203,6 +203,17 @@ void RecordingStream::failUnconfirmed(int error) {
                   themText() + ": " + std::generic_category().message(error));
 }
 
+std::string RecordingStream::whereItIs() const {
+    if (!target_->isRewritable()) {
+        return framesText() + " written to " + name_ + "; it is whole at the end";
+    }
+    if (!isKept()) {
+        return "no report is recorded yet" +
+               (target_->wasThere() ? ", and " + name_ + " is as it was" : std::string());
+    }
+    return framesText() + " in " + name_ + "; what is written there is whole without SIGUSR1";
+}
+
 std::string RecordingStream::themText() const {
     return frames_ == 1 ? "it" : "them";
 }

@@ -67,6 +67,8 @@ public:
     [[nodiscard]] const std::string& name() const noexcept { return name_; }
     /// Whether the file stays as far as it is written.
     [[nodiscard]] bool isKept() const noexcept { return isKept_ || !target_->isRewritable(); }
+    /// What is where by now, for one who asks while it goes on.
+    [[nodiscard]] std::string whereItIs() const;
     [[nodiscard]] bool isFinished() const noexcept { return isFinished_; }
 
 private:

@@ -427,6 +427,24 @@ TEST(RecordingStreamTest, WhatAFullDiskKeptIsSafeBeforeItIsCalledSo) {
               "disk did not confirm them");
 }
 
+TEST(RecordingStreamTest, SaysWhatIsWhere) {
+    const Frames frames = someFrames();
+    Disk disk;
+    const auto stream = streamTo(disk);
+    stream->add(frames[0]);
+    stream->flush();
+    EXPECT_EQ(stream->whereItIs(), "no report is recorded yet, and session.json is as it was");
+    stream->add(frames[1]);
+    stream->flush();
+    EXPECT_EQ(stream->whereItIs(),
+              "2 frames are in session.json; what is written there is whole without SIGUSR1");
+    Disk made{.wasThere = false};
+    EXPECT_EQ(streamTo(made)->whereItIs(), "no report is recorded yet");
+    Disk pipe{.isRewritable = false};
+    EXPECT_EQ(streamTo(pipe)->whereItIs(),
+              "0 frames are written to session.json; it is whole at the end");
+}
+
 TEST(RecordingStreamTest, NothingIsAsItWasWhereThereWasNothing) {
     Disk disk{.writesUntilFailure = 1, .failWith = EIO, .wasThere = false};
     EXPECT_EQ(record(*streamTo(disk), someFrames()),
