@@ -26,7 +26,8 @@ namespace VexaTouch::Host {
 /// setProperty() may be called on any thread until end() begins.
 class HostSession {
 public:
-    /// Called on the queue's thread with each event; may keep it, must not throw.
+    /// Called on the queue's thread with each event; may keep it, must not throw. What is logged in
+    /// it may be dropped: nothing on that thread waits for a slow reader of the log.
     using EventSink = std::function<void(const Vexa::HidEvent& event)>;
 
     /// `service` is the handle of a registered device; `properties` goes to Probe and Start. The

@@ -13,7 +13,8 @@ struct DeliveredEvent {
     /// Its time is the host time at which the service took up the report that caused the event;
     /// index and device clock are unknown to a host, and 0.
     EventRecord record;
-    /// From the reading of that report to the callback, in nanoseconds.
+    /// To the callback, in nanoseconds: from the reading of that report where this process reads
+    /// the device, from its taking up where the daemon tells of the event.
     std::uint64_t latencyNs = 0;
 
     /// The event as it stands when the callback is called at `nowTicks`, its report having been

@@ -59,8 +59,8 @@ constexpr std::array<OptionEntry, 5> kOptions = {{
 constexpr std::array<ExitCodeEntry, 3> kExitCodes = {{
     {kExitSuccess, "the devices were listed, and be it none"},
     {kExitFailure,
-     "the devices cannot be listed, or on the bus that --bus names there is no daemon or it "
-     "refuses"},
+     "the devices cannot be listed, NODE is no HID device, or on the bus that --bus names there is "
+     "no daemon or it refuses"},
     {kExitUsage, "the command line is wrong"},
 }};
 

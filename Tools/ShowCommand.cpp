@@ -355,13 +355,12 @@ int runShow(const Arguments& arguments, Streams& streams) {
     Replay replay(std::exchange(file.frames, {}), std::move(settings));
     if (text) {
         printTexts(replay, range, arguments.given("--unsigned"), file.name, streams);
-        return kExitSuccess;
-    }
-    if (!whole || !streams.outIsTerminal) {
+    } else if (!whole || !streams.outIsTerminal) {
         printFrames(replay, range, depth, streams);
-        return kExitSuccess;
+    } else {
+        Player(replay, speed, depth, streams).play();
     }
-    Player(replay, speed, depth, streams).play();
+    warnOfLostSetting(replay, "show", "--set", streams);
     if (const int signal = LiveScreen::interrupted(); signal != 0) {
         // The terminal is tidy: now the signal does what it does to every program, so that the
         // shell knows why this one ended.

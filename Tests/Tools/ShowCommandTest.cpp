@@ -473,6 +473,20 @@ std::string longRecording(const TemporaryFolder& folder) {
     return folder.file("long.json", containerText(frames));
 }
 
+TEST(ShowCommand, ASettingThatTheRecordingTakesBackIsWarnedOf) {
+    const TemporaryFolder folder;
+    RecordedSession recorded;
+    recorded.set("Algs.HoldTimeoutMilliseconds", 300).feel(nothing());
+    const std::string file = folder.file("set.json", recorded.text());
+    const std::vector<std::string> show = {"show", file, "--set", "HoldTimeoutMilliseconds=2000"};
+    EXPECT_EQ(runCommand(show).error,
+              "vexatouch show: --set Algs.HoldTimeoutMilliseconds held until frame 0 only, in "
+              "which the recording sets it; with --pin it holds to the end\n");
+    std::vector<std::string> pinned = show;
+    pinned.emplace_back("--pin");
+    EXPECT_EQ(runCommand(pinned).error, "");
+}
+
 TEST(ShowCommand, AnInterruptLeavesTheTerminalTidy) {
     const TemporaryFolder folder;
     ProgramOnTerminal program({"show", longRecording(folder)});

@@ -13,7 +13,8 @@
 
 namespace VexaTouch::Tools::Daemon {
 
-/// What the daemon would tell of a device.
+/// What there is to tell of a device in the words of the daemon, which has a node and a reason
+/// besides: both are empty here.
 struct OwnStatistics {
     Vexa::PropertyValue properties;  ///< of the interface of its surfaces, by name
     Vexa::PropertyValue statistics;
