@@ -26,6 +26,8 @@ constexpr const char* kSubsystem = "hidraw";
 constexpr const char* kUdevSocket = "/run/udev/control";
 /// Taken at once; whatever comes faster waits for the next time.
 constexpr std::size_t kMostEvents = 256;
+// Surfaces of which it is remembered that they were one.
+constexpr std::size_t kMostFormer = 256;
 
 template <auto kRelease>
 struct Releaser {
@@ -266,6 +268,8 @@ bool SurfaceWatch::isSurface(const Look& look) {
     }
     if (match_.matches(surface)) {
         former_.insert_or_assign(identityOf(surface), false);
+        // Enough for what is plugged in again; a device with ever new serial numbers gets no more.
+        if (former_.size() > kMostFormer) former_.erase(former_.begin());
         return true;
     }
     const std::string identity = identityOf(surface);

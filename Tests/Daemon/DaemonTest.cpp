@@ -288,6 +288,26 @@ TEST_F(DaemonTest, AStreamBeginsWithEverySettingAndHasEveryReport) {
     }
 }
 
+TEST_F(DaemonTest, AStreamThatIsOpenWhenTheDaemonEndsIsWholeToItsReader) {
+    start("sim:" VEXA_SOURCE_DIR "/Examples/taps.gesture");
+    const FileDescriptor frames = client->recordStream(first);
+    const std::uint64_t sent = 78;
+    waitForReports(1, sent);
+    client.reset();
+    daemon.reset();
+    std::uint64_t taken = 0;
+    Tools::FrameDecoder decoder(
+        {.onFrame =
+             [&](const RecordedFrame& frame) {
+                 taken += frame.type == RecordedFrame::Type::InputReport ? 1U : 0U;
+             },
+         .onGap = [](const Tools::FrameGap&) { ADD_FAILURE() << "frames were lost"; }});
+    const std::string bytes = readToEnd(frames);
+    decoder.write({reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size()});
+    EXPECT_TRUE(decoder.isAtEnd());
+    EXPECT_GT(taken, 0U);
+}
+
 TEST_F(DaemonTest, AReaderThatIsTooSlowLosesFramesAndHoldsNobodyUp) {
     daemon.emplace(bus->address());
     client.emplace(bus->address());

@@ -6,11 +6,15 @@
 #include <sys/epoll.h>
 
 #include <algorithm>
+#include <chrono>
 #include <optional>
 #include <utility>
 
 namespace VexaTouch::Tools::Daemon {
 namespace {
+
+/// How long the daemon's end waits for those who read recordings.
+constexpr std::chrono::seconds kStreamPatience{1};
 
 /// "2 gaps, 14 frames lost".
 std::string gapsText(const ReportCounts& counts) {
@@ -226,6 +230,9 @@ void Daemon::taken(Device& device) {
 
 void Daemon::end(std::function<void()> done) {
     sourceWatch_.reset();
+    done = [this, done = std::move(done)]() mutable {
+        streams_.end(kStreamPatience, std::move(done));
+    };
     if (devices_.empty()) {
         done();
         return;

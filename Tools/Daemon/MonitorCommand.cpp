@@ -51,7 +51,8 @@ constexpr std::string_view kDescription =
     "Prints the gestures of the daemon's surfaces until SIGINT, SIGTERM or SIGHUP, as run does: "
     "the "
     "host time since the start, the latency from the taking up of the report to the host (with "
-    "--device from its reading on, as run has it), the kind and the region. When signals were lost because the bus did not take them, standard error says "
+    "--device from its reading on, as run has it), the kind and the region. When signals were lost "
+    "because the bus did not take them, standard error says "
     "how many.\n"
     "\n"
     "With --device it has a service and a device of its own instead and needs no daemon.";

@@ -103,14 +103,13 @@ void RecordStreams::abandon(const std::shared_ptr<FrameFeed>& feed) {
 
 void RecordStreams::end(std::chrono::nanoseconds patience, std::function<void()> done) {
     done_ = std::move(done);
-    patience_ = loop_.after(
-        streams_.empty() ? std::chrono::nanoseconds::zero() : patience, [this] {
-            const auto ended = std::exchange(done_, nullptr);
-            while (!streams_.empty()) {
-                finish(streams_.front());
-            }
-            ended();
-        });
+    patience_ = loop_.after(streams_.empty() ? std::chrono::nanoseconds::zero() : patience, [this] {
+        const auto ended = std::exchange(done_, nullptr);
+        while (!streams_.empty()) {
+            finish(streams_.front());
+        }
+        ended();
+    });
 }
 
 std::size_t RecordStreams::count(const std::string& owner) const {

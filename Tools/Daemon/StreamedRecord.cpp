@@ -120,9 +120,8 @@ void recordStreamed(const FileDescriptor& frames, const StreamedRecordOptions& o
         throw stream.finishAfter(error.what());
     }
     if (writer.isFarEndGone()) {
-        throw stream.finishAfter(
-            std::string("the surface was unplugged, or the daemon has ended") +
-            (writer.isWhole() ? "" : ", and what came last is missing"));
+        throw stream.finishAfter(std::string("the surface was unplugged, or the daemon has ended") +
+                                 (writer.isWhole() ? "" : ", and what came last is missing"));
     }
     stream.finish();
 }
