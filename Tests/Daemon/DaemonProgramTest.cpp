@@ -508,6 +508,9 @@ TEST_F(DaemonProgramTest, CommandsReachTheOneSurfaceOrTheOneThatIsNamed) {
     EXPECT_EQ(runCommand(atBus({"get", key, "--surface", "2"})), (CommandResult{0, "300\n", ""}));
     EXPECT_EQ(runCommand(atBus({"get", key, "--surface", "1"})), (CommandResult{0, "500\n", ""}));
     EXPECT_EQ(runCommand(atBus({"get", key, "--surface", "3"})).exitCode, 1);
+    EXPECT_EQ(runCommand(atBus({"monitor", "--surface", "2", "--duration", "1ms"})).error,
+              "watching 1 surface\n");
+    EXPECT_EQ(runCommand(atBus({"monitor", "--duration", "1ms"})).error, "watching 2 surfaces\n");
     const CommandResult stats = runCommand(atBus({"stats", "--json", "--surface", "1"}));
     EXPECT_EQ(stats.exitCode, 0);
     EXPECT_THAT(stats.out,

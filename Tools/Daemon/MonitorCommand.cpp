@@ -106,7 +106,8 @@ int runMonitor(const Arguments& arguments, Streams& streams) {
     Daemon::DaemonClient client(arguments.value(kBusOption.name));
     std::string rule = std::string("type='signal',sender='") + client.owner() + "',interface='" +
                        Daemon::BusNames::kDevice + '\'';
-    if (arguments.given(Daemon::kSurfaceOption.name)) {
+    const bool isOne = arguments.given(Daemon::kSurfaceOption.name);
+    if (isOne) {
         rule += ",path='" + client.choose(arguments) + '\'';
     }
     std::uint64_t events = 0;
@@ -139,7 +140,8 @@ int runMonitor(const Arguments& arguments, Streams& streams) {
         [&](const Daemon::BusMessage&) { end(); });
     client.bus().attach(loop, end);
     // Tells whether there is a daemon that lets us watch; what it sends is caught already.
-    const std::size_t surfaces = client.devices().size();
+    const std::size_t there = client.devices().size();
+    const std::size_t surfaces = isOne ? 1 : there;
     // Not before: a bus that does not answer can be left.
     const WakeUp wake;
     SignalWatch signals(wake);
