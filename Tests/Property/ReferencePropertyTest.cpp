@@ -181,9 +181,10 @@ TEST(ReferenceProperty, EveryFieldOfEveryFrameEqualsTheLiteralReading) {
                            counts.try_emplace(std::string(name)).first->second += count;
                        });
     }
-    if (frames >= 200'000) {
-        // The sessions reach whatever can be counted.
-        EXPECT_EQ(counts.size(), 24U);
+    EXPECT_EQ(counts.size(), 24U);
+    if (frames >= 2'000'000) {
+        // The sessions reach whatever can be counted. A tenth of these frames now and then misses
+        // what is rarest.
         for (const auto& [name, count] : counts) {
             EXPECT_GT(count, 0U) << name;
         }
