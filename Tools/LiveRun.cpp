@@ -192,10 +192,13 @@ void LiveRun::keep() {
         work_.notify();
     }
     // A key that is held repeats until it is released, and both of these may take seconds: last
-    // reports that nobody takes, a node whose closing waits for a request.
+    // reports that nobody takes, a node whose closing waits for a request. What is on its way to
+    // the keyboard comes first, so that it does not press one behind the release.
+    session_.drain();
     releaseKeys();
     if (unplugged_) {
         waitForLastReports();
+        session_.drain();
         releaseKeys();
     }
     session_.halt();

@@ -35,6 +35,7 @@ using Testing::mixedSession;
 using ::testing::SizeIs;
 using Testing::threadCount;
 using Testing::untimed;
+using Testing::waitForThreads;
 
 constexpr double kMax = RecordedDevice::kAsFastAsTaken;
 
@@ -218,7 +219,7 @@ TEST(RecordedDeviceTest, ClosesWithinTheLongestRestAndLeavesNothingBehind) {
         reader.readReports(random() % 51);
         if (random() % 2 == 0) reader.close();
     }
-    EXPECT_EQ(threadCount(), threads);
+    EXPECT_TRUE(waitForThreads(threads));
     EXPECT_EQ(descriptorCount(), descriptors);
 }
 

@@ -33,6 +33,7 @@ using ::testing::IsEmpty;
 using Testing::reportsOf;
 using Testing::threadCount;
 using Testing::untimed;
+using Testing::waitForThreads;
 
 constexpr std::string_view kGestures =
     "tap vol+ 60ms\n"
@@ -277,7 +278,7 @@ TEST(SimulatedSurfaceTest, ClosesAtAnyMomentAndLeavesNothingBehind) {
         reader.readReports(isSlow ? random() % 2 : random() % 100);
         if (random() % 2 == 0) reader.close();
     }
-    EXPECT_EQ(threadCount(), threads);
+    EXPECT_TRUE(waitForThreads(threads));
     EXPECT_EQ(descriptorCount(), descriptors);
 }
 
