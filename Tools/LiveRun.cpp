@@ -144,7 +144,7 @@ void LiveRun::run() {
     if (options_.duration) {
         deadline_ = start + *options_.duration;
     }
-    nextLook_ = start + watch_.interval();
+    static_cast<void>(watch_.lookIfDue(start));
     runToEnd();
     takeEvents();
     draw(true);
@@ -187,7 +187,7 @@ void LiveRun::keep() {
     const Vexa::LogWithoutBlocking logWithoutBlocking;
     while (!isOver()) {
         waitForEnd();
-        lookAfterReports();
+        stuck_ = watch_.lookIfDue(std::chrono::steady_clock::now());
         // Whatever it was, it may be something for the other as well.
         work_.notify();
     }
@@ -214,7 +214,7 @@ bool LiveRun::isOver() const {
 }
 
 void LiveRun::waitForEnd() {
-    const Time until = deadline_ ? std::min(nextLook_, *deadline_) : nextLook_;
+    const Time until = deadline_ ? std::min(watch_.nextLook(), *deadline_) : watch_.nextLook();
     if (wake_.wait(until, device_->hangUpDescriptor())) {
         unplugged_ = true;
     }
@@ -261,14 +261,6 @@ void LiveRun::handleWork() {
     }
     tellOfGaps();
     writeRecordingOnWish();
-}
-
-void LiveRun::lookAfterReports() {
-    const Time now = std::chrono::steady_clock::now();
-    if (now >= nextLook_) {
-        nextLook_ = now + watch_.interval();
-        stuck_ = watch_.look();
-    }
 }
 
 void LiveRun::tellOfGaps() {

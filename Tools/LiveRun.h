@@ -95,7 +95,6 @@ private:
     [[nodiscard]] bool isOver() const;
     void waitForEnd();
     void waitForLastReports();
-    void lookAfterReports();
     void releaseKeys() noexcept;
 
     // The thread that runs it.
@@ -138,7 +137,6 @@ private:
     // The keeper's while it lives.
     std::optional<Time> deadline_;
     ReportWatch watch_;
-    Time nextLook_;
     bool stuck_ = false;
     std::atomic<bool> enough_ = false;  // the thread that runs it has no more use for events
     std::atomic<bool> halted_ = false;

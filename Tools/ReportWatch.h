@@ -19,8 +19,7 @@ public:
     static constexpr const char* kFault = "the service takes no reports; its log says why";
 
     /// `patience` is how long reports may wait, or a live device be read by nobody, while no report
-    /// is handled. The device must outlive the
-    /// watch.
+    /// is handled. The device must outlive the watch.
     ReportWatch(const ObservedDevice& device, std::chrono::nanoseconds patience) noexcept
         : device_(device), interval_(patience / kLooks) {}
 
